@@ -1,0 +1,26 @@
+# zyrd: build, test and run from a fresh Debian 12 machine.
+BUILD_DIR ?= build
+RUN_ROOT ?= $(CURDIR)/.run
+CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DZYRD_WERROR=ON
+
+.PHONY: all deps build test run clean
+
+all: build
+
+deps:
+	scripts/install-deps
+
+$(BUILD_DIR)/build.ninja:
+	cmake -S . -B $(BUILD_DIR) -G Ninja $(CMAKE_FLAGS)
+
+build: deps $(BUILD_DIR)/build.ninja
+	cmake --build $(BUILD_DIR)
+
+test: build
+	ctest --test-dir $(BUILD_DIR) --output-on-failure -j2
+
+run: build
+	scripts/run-local $(BUILD_DIR) $(RUN_ROOT)
+
+clean:
+	rm -rf $(BUILD_DIR) $(RUN_ROOT)

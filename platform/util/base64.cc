@@ -1,0 +1,73 @@
+#include "platform/util/base64.h"
+
+#include <array>
+
+namespace {
+
+constexpr char kAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+
+constexpr std::array<int8_t, 256> MakeReverse() {
+  std::array<int8_t, 256> table{};
+  for (auto& v : table) v = -1;
+  for (int i = 0; i < 64; ++i) table[static_cast<uint8_t>(kAlphabet[i])] = static_cast<int8_t>(i);
+  return table;
+}
+
+constexpr auto kReverse = MakeReverse();
+
+}  // namespace
+
+size_t Base64_EncodedLength(const uint8_t*, size_t length) { return (length + 2) / 3 * 4 + 1; }
+
+bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize,
+                   size_t* dstLength) {
+  size_t needed = Base64_EncodedLength(src, length);
+  if (dst == nullptr || dstSize < needed) return false;
+  size_t o = 0;
+  size_t i = 0;
+  for (; i + 3 <= length; i += 3) {
+    uint32_t v = (uint32_t{src[i]} << 16) | (uint32_t{src[i + 1]} << 8) | src[i + 2];
+    dst[o++] = kAlphabet[(v >> 18) & 63];
+    dst[o++] = kAlphabet[(v >> 12) & 63];
+    dst[o++] = kAlphabet[(v >> 6) & 63];
+    dst[o++] = kAlphabet[v & 63];
+  }
+  if (size_t rest = length - i; rest > 0) {
+    uint32_t v = uint32_t{src[i]} << 16;
+    if (rest == 2) v |= uint32_t{src[i + 1]} << 8;
+    dst[o++] = kAlphabet[(v >> 18) & 63];
+    dst[o++] = kAlphabet[(v >> 12) & 63];
+    dst[o++] = rest == 2 ? kAlphabet[(v >> 6) & 63] : '=';
+    dst[o++] = '=';
+  }
+  dst[o] = '\0';
+  if (dstLength != nullptr) *dstLength = o;
+  return true;
+}
+
+bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out) {
+  out->clear();
+  if (text.size() % 4 != 0) return false;
+  out->reserve(text.size() / 4 * 3);
+  for (size_t i = 0; i < text.size(); i += 4) {
+    bool last = i + 4 == text.size();
+    int v[4];
+    int pad = 0;
+    for (int k = 0; k < 4; ++k) {
+      char c = text[i + k];
+      if (c == '=' && last && k >= 2) {
+        v[k] = 0;
+        ++pad;
+        continue;
+      }
+      if (pad > 0) return false;  // data after padding
+      v[k] = kReverse[static_cast<uint8_t>(c)];
+      if (v[k] < 0) return false;
+    }
+    uint32_t w = (uint32_t(v[0]) << 18) | (uint32_t(v[1]) << 12) | (uint32_t(v[2]) << 6) | v[3];
+    out->push_back(static_cast<uint8_t>(w >> 16));
+    if (pad < 2) out->push_back(static_cast<uint8_t>(w >> 8));
+    if (pad < 1) out->push_back(static_cast<uint8_t>(w));
+  }
+  return true;
+}

@@ -1,0 +1,74 @@
+#include "platform/runtime/scheduler.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <future>
+
+#include "platform/runtime/app.h"
+#include "platform/runtime/thread_pool.h"
+
+namespace {
+
+using namespace std::chrono_literals;
+
+TEST(AsioScheduler, RunsOnceAfterTheDelayAndCanRearmFromTheCallback) {
+  Strake::System::AsioScheduler scheduler;
+  std::promise<void> done;
+  std::atomic<int> runs{0};
+  std::function<void()> tick = [&] {
+    if (++runs < 3) {
+      scheduler.Schedule(1ms, tick);
+    } else {
+      done.set_value();
+    }
+  };
+  auto start = std::chrono::steady_clock::now();
+  scheduler.Schedule(20ms, tick);
+  ASSERT_EQ(done.get_future().wait_for(5s), std::future_status::ready);
+  EXPECT_GE(std::chrono::steady_clock::now() - start, 20ms);
+  EXPECT_EQ(runs.load(), 3);
+}
+
+TEST(AsioScheduler, CancelledItemNeverRuns) {
+  Strake::System::AsioScheduler scheduler;
+  std::atomic<bool> ran{false};
+  auto item = scheduler.Schedule(50ms, [&] { ran = true; });
+  item.Cancel();
+  std::promise<void> later;
+  scheduler.Schedule(100ms, [&] { later.set_value(); });
+  ASSERT_EQ(later.get_future().wait_for(5s), std::future_status::ready);
+  EXPECT_FALSE(ran.load());
+}
+
+TEST(ThreadPool, LongRunningTasksEachGetAThread) {
+  Strake::Service::ThreadPool pool(5, "t-");
+  std::atomic<int> started{0};
+  std::promise<void> release;
+  auto gate = release.get_future().share();
+  for (int i = 0; i < 5; ++i) {
+    pool.Enqueue([&, gate] {
+      ++started;
+      gate.wait();
+    });
+  }
+  for (int i = 0; i < 500 && started.load() < 5; ++i) std::this_thread::sleep_for(2ms);
+  EXPECT_EQ(started.load(), 5);
+  release.set_value();
+}
+
+TEST(App, RunBlocksUntilStop) {
+  Strake::Service::App app(Strake::Service::CreateScratchConfig());
+  std::atomic<bool> returned{false};
+  std::thread runner([&] {
+    app.Run();
+    returned = true;
+  });
+  std::this_thread::sleep_for(20ms);
+  EXPECT_FALSE(returned.load());
+  app.Stop();
+  runner.join();
+  EXPECT_TRUE(returned.load());
+}
+
+}  // namespace

@@ -1,0 +1,60 @@
+#include "platform/util/base64.h"
+
+#include <gtest/gtest.h>
+
+#include "platform/util/paths.h"
+
+namespace {
+
+std::string Encode(std::string_view in) {
+  const auto* p = reinterpret_cast<const uint8_t*>(in.data());
+  std::string out(Base64_EncodedLength(p, in.size()), '?');
+  size_t len = 0;
+  EXPECT_TRUE(Base64_Encode(p, in.size(), out.data(), out.size(), &len));
+  EXPECT_EQ(out[len], '\0');
+  out.resize(len);
+  return out;
+}
+
+TEST(Base64, KnownVectors) {
+  EXPECT_EQ(Encode(""), "");
+  EXPECT_EQ(Encode("f"), "Zg==");
+  EXPECT_EQ(Encode("fo"), "Zm8=");
+  EXPECT_EQ(Encode("foo"), "Zm9v");
+  EXPECT_EQ(Encode("foobar"), "Zm9vYmFy");
+  EXPECT_EQ(Encode(std::string("\xff\xfe\x00", 3)), "//4A");
+}
+
+TEST(Base64, RoundTripsEveryLength) {
+  std::vector<uint8_t> data;
+  for (int n = 0; n < 70; ++n) {
+    std::string text = Encode(std::string_view(reinterpret_cast<char*>(data.data()), data.size()));
+    std::vector<uint8_t> back;
+    ASSERT_TRUE(Base64_Decode(text, &back)) << n;
+    EXPECT_EQ(back, data);
+    data.push_back(static_cast<uint8_t>(n * 37 + 11));
+  }
+}
+
+TEST(Base64, EncodeRefusesSmallBuffer) {
+  const uint8_t in[3] = {1, 2, 3};
+  char out[4];
+  EXPECT_FALSE(Base64_Encode(in, 3, out, sizeof out, nullptr));
+}
+
+TEST(Base64, DecodeRejectsMalformedText) {
+  std::vector<uint8_t> out;
+  for (const char* bad : {"Zg=", "Zg=a", "Z===", "Zm9v!A==", "=Zm9", "Zg==Zg==", "Zm 9v"}) {
+    EXPECT_FALSE(Base64_Decode(bad, &out)) << bad;
+  }
+}
+
+TEST(RootPath, PlacesAbsolutePathsUnderZyrdRoot) {
+  unsetenv("ZYRD_ROOT");
+  EXPECT_EQ(Groundwork::RootPath("/var/lib/zyrd/configstore.db"), "/var/lib/zyrd/configstore.db");
+  setenv("ZYRD_ROOT", "/tmp/run/", 1);
+  EXPECT_EQ(Groundwork::RootPath("/etc/x.xml"), "/tmp/run/etc/x.xml");
+  unsetenv("ZYRD_ROOT");
+}
+
+}  // namespace

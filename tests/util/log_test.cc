@@ -1,0 +1,137 @@
+#include "platform/util/log.h"
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <thread>
+
+#include "platform/util/panic.h"
+#include "tests/support/log_capture.h"
+
+namespace {
+
+TEST(LogLevelNames, MapToThresholds) {
+  int t = -5;
+  ASSERT_TRUE(Groundwork::ParseLogLevel("error", &t));
+  EXPECT_EQ(t, 2);
+  ASSERT_TRUE(Groundwork::ParseLogLevel("warning", &t));
+  EXPECT_EQ(t, 3);
+  ASSERT_TRUE(Groundwork::ParseLogLevel("info", &t));
+  EXPECT_EQ(t, 5);
+  ASSERT_TRUE(Groundwork::ParseLogLevel("verbose", &t));
+  EXPECT_EQ(t, 6);
+  ASSERT_TRUE(Groundwork::ParseLogLevel("trivia", &t));
+  EXPECT_EQ(t, 7);
+  ASSERT_TRUE(Groundwork::ParseLogLevel("none", &t));
+  EXPECT_EQ(t, Groundwork::kLogOff);
+  ASSERT_TRUE(Groundwork::ParseLogLevel("4", &t));
+  EXPECT_EQ(t, 4);
+
+  t = 99;
+  EXPECT_FALSE(Groundwork::ParseLogLevel("loud", &t));
+  EXPECT_FALSE(Groundwork::ParseLogLevel("8", &t));
+  EXPECT_FALSE(Groundwork::ParseLogLevel("", &t));
+  EXPECT_EQ(t, 99);
+}
+
+TEST(LogThreshold, LevelsZeroAndOnePassWheneverLoggingIsOn) {
+  ZyrdTest::LogCapture capture(2);
+  EXPECT_TRUE(Log_IsEnabled(0));
+  EXPECT_TRUE(Log_IsEnabled(1));
+  EXPECT_TRUE(Log_IsEnabled(2));
+  EXPECT_FALSE(Log_IsEnabled(3));
+
+  Log_Level(0, "op %d\n", 1);
+  Log_Level(3, "dropped\n");
+  Log_Level(2, "kept %s\n", "error");
+  auto lines = capture.Lines();
+  ASSERT_EQ(lines.size(), 2u);
+  EXPECT_EQ(lines[0].text, "op 1\n");
+  EXPECT_EQ(lines[1].text, "kept error\n");
+
+  Groundwork::SetLogThreshold(Groundwork::kLogOff);
+  EXPECT_FALSE(Log_IsEnabled(0));
+  Log_Level(0, "silent\n");
+  EXPECT_EQ(capture.Lines().size(), 2u);
+}
+
+TEST(LogRecords, LongRecordsAreNotTruncated) {
+  ZyrdTest::LogCapture capture;
+  std::string big(5000, 'x');
+  Log_Level(5, "%s\n", big.c_str());
+  ASSERT_EQ(capture.Lines().size(), 1u);
+  EXPECT_EQ(capture.Lines()[0].text, big + "\n");
+}
+
+TEST(LogRecords, FormattedLineCarriesPrefixAndOneLineFeed) {
+  Groundwork::SetLogThreadName("tester");
+  std::string line = Groundwork::FormatLogLine(3, "hello\n");
+  EXPECT_NE(line.find(" zyrd[" + std::to_string(getpid()) + "] warning [tester] hello\n"),
+            std::string::npos);
+  EXPECT_EQ(line.back(), '\n');
+  EXPECT_EQ(line.find('\n'), line.size() - 1);
+  EXPECT_EQ(Groundwork::FormatLogLine(5, "no newline").back(), '\n');
+  Groundwork::SetLogThreadName("");
+}
+
+// Concurrent writers to standard error: every line that arrives is whole.
+TEST(LogRecords, ConcurrentStderrLinesDoNotInterleave) {
+  int fds[2];
+  ASSERT_EQ(pipe(fds), 0);
+  int savedStderr = dup(STDERR_FILENO);
+  dup2(fds[1], STDERR_FILENO);
+  close(fds[1]);
+
+  std::string collected;
+  std::thread reader([&] {
+    char buf[4096];
+    ssize_t n;
+    while ((n = read(fds[0], buf, sizeof buf)) > 0) collected.append(buf, static_cast<size_t>(n));
+  });
+  {
+    int saved = Groundwork::GetLogThreshold();
+    Groundwork::SetLogThreshold(5);
+    std::vector<std::thread> writers;
+    for (int t = 0; t < 4; ++t) {
+      writers.emplace_back([t] {
+        std::string payload(300, static_cast<char>('a' + t));
+        for (int i = 0; i < 200; ++i) Log_Level(5, "%s\n", payload.c_str());
+      });
+    }
+    for (auto& w : writers) w.join();
+    Groundwork::SetLogThreshold(saved);
+  }
+  dup2(savedStderr, STDERR_FILENO);
+  close(savedStderr);
+  reader.join();
+  close(fds[0]);
+
+  size_t lines = 0;
+  size_t pos = 0;
+  while (pos < collected.size()) {
+    size_t end = collected.find('\n', pos);
+    ASSERT_NE(end, std::string::npos);
+    std::string_view line(collected.data() + pos, end - pos);
+    std::string_view payload = line.substr(line.size() - 300);
+    EXPECT_EQ(payload.find_first_not_of(payload[0]), std::string_view::npos) << line;
+    ++lines;
+    pos = end + 1;
+  }
+  EXPECT_EQ(lines, 800u);
+}
+
+TEST(PanicDeathTest, VerifyNamesFileWithoutExtensionAndLine) {
+  EXPECT_DEATH(VERIFY(1 + 1 == 3), "VERIFY tests/util/log_test:[0-9]+");
+  EXPECT_DEATH(NOT_REACHED(), "NOT_REACHED tests/util/log_test:[0-9]+");
+}
+
+TEST(PanicDeathTest, ReachesStderrEvenWhenLoggingIsOff) {
+  EXPECT_DEATH(
+      {
+        Groundwork::SetLogThreshold(Groundwork::kLogOff);
+        Panic("boom %d\n", 7);
+      },
+      "boom 7");
+}
+
+}  // namespace
