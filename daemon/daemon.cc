@@ -69,6 +69,7 @@ void ExitDaemon(int status) {
 }
 
 void RunDaemon() {
+  Groundwork::SetLogThreadName("main");
   InitRuntime();
 
   auto defaultLogger = Strake::Service::Logger::sDefaultLogger;
