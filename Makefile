@@ -18,9 +18,10 @@ build: deps $(BUILD_DIR)/build.ninja
 
 test: build
 	ctest --test-dir $(BUILD_DIR) --output-on-failure -j2
+	scripts/run-fuzzers
 
 run: build
 	scripts/run-local $(BUILD_DIR) $(RUN_ROOT)
 
 clean:
-	rm -rf $(BUILD_DIR) $(RUN_ROOT)
+	rm -rf $(BUILD_DIR) build-fuzz $(RUN_ROOT)
