@@ -73,11 +73,15 @@ class DescriptionReader {
     return true;
   }
 
-  bool Number(std::string_view text, long long min, long long max, long long* out) {
+  // A decimal number of at least `min`; above `max` it fails, or counts as
+  // `max` when `clamp` is set.
+  static bool Number(std::string_view text, long long min, long long max, bool clamp,
+                     long long* out) {
     if (text.empty() || text.size() > 18) return false;
     long long v = 0;
     auto [end, ec] = std::from_chars(text.data(), text.data() + text.size(), v);
     if (ec != std::errc() || end != text.data() + text.size() || v < min) return false;
+    if (v > max && !clamp) return false;
     *out = v > max ? max : v;
     return true;
   }
@@ -95,7 +99,7 @@ class DescriptionReader {
       }
     }
     long long p = 0;
-    if (!Number(port->text.view(), 1, 65535, &p) || p > 65535) {
+    if (!Number(port->text.view(), 1, 65535, false, &p)) {
       return Fail(std::string(where) + " Port must be a number from 1 to 65535");
     }
     out->host.assign(h);
@@ -166,7 +170,7 @@ class DescriptionReader {
     constexpr std::string_view kUnit = ":Seconds";
     long long seconds = 0;
     if (t.size() <= kUnit.size() || t.substr(t.size() - kUnit.size()) != kUnit ||
-        !Number(t.substr(0, t.size() - kUnit.size()), 1, kMaxTimeoutSeconds, &seconds)) {
+        !Number(t.substr(0, t.size() - kUnit.size()), 1, kMaxTimeoutSeconds, true, &seconds)) {
       return Fail("Timeout must be a whole number of seconds of at least 1, as N:Seconds");
     }
     out->timeoutSeconds = static_cast<int>(seconds);

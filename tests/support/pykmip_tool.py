@@ -6,12 +6,13 @@ command-line tool by the C++ test harness (tests/support/pykmip_server.h):
 
   pykmip_tool.py pki DIR
       Writes a test PKI into DIR (see make_pki for the file names).
-  pykmip_tool.py config DIR PORT
-      Writes DIR/server.conf for a PyKMIP server on 127.0.0.1:PORT that uses
-      the PKI in DIR, with an empty policy directory and its own database.
-  pykmip_tool.py admin DIR PORT [--client NAME] COMMAND...
-      Runs each COMMAND against the server as client NAME (default "client"),
-      printing one result line per command: "create BITS" prints the new id,
+  pykmip_tool.py config DIR PORT [RUN_DIR]
+      Writes RUN_DIR/server.conf (RUN_DIR defaults to DIR) for a PyKMIP
+      server on 127.0.0.1:PORT that uses the PKI in DIR, with an empty policy
+      directory and its own database in RUN_DIR.
+  pykmip_tool.py admin DIR PORT [--client NAME] COMMAND [-- COMMAND]...
+      Runs the commands (separated by "--") against the server as client
+      NAME (default "client"), printing one result line per command: "create BITS" prints the new id,
       "activate ID", "revoke ID deactivated|compromised", "destroy ID" print
       "ok", "get ID" prints the key bytes in hex, "state ID" the state number.
       "$N" in an argument stands for the output of the N-th command (1-based).
@@ -134,11 +135,14 @@ def make_pki(directory):
         _write(d, name, _cert(cn, key, issuer, issuer_key, eku=eku), key)
 
 
-def write_server_config(directory, port):
-    """Writes server.conf (and an empty policy directory) for 127.0.0.1:port."""
+def write_server_config(directory, port, run_directory=None):
+    """Writes server.conf (and an empty policy directory) for 127.0.0.1:port
+    into run_directory (default: directory); returns its path."""
     d = pathlib.Path(directory).resolve()
-    (d / "policies").mkdir(exist_ok=True)
-    conf = d / "server.conf"
+    run = pathlib.Path(run_directory).resolve() if run_directory else d
+    run.mkdir(parents=True, exist_ok=True)
+    (run / "policies").mkdir(exist_ok=True)
+    conf = run / "server.conf"
     conf.write_text(
         "[server]\n"
         "hostname=127.0.0.1\n"
@@ -151,7 +155,7 @@ def write_server_config(directory, port):
         "enable_tls_client_auth=True\n"
         "logging_level=INFO\n"
         "database_path=%s\n" % (port, d / "server.pem", d / "server.key", d / "ca.pem",
-                                d / "policies", d / "pykmip.db"))
+                                run / "policies", run / "pykmip.db"))
     return conf
 
 
@@ -235,7 +239,7 @@ def main(argv):
         make_pki(argv[1])
         return 0
     if len(argv) >= 3 and argv[0] == "config":
-        write_server_config(argv[1], int(argv[2]))
+        write_server_config(argv[1], int(argv[2]), argv[3] if len(argv) > 3 else None)
         return 0
     if len(argv) >= 3 and argv[0] == "admin":
         directory, port, rest = argv[1], int(argv[2]), argv[3:]
