@@ -12,13 +12,12 @@
 //
 // Failures print "kmipcli: error N: explanation" on standard error and exit
 // with status 1; wrong usage exits with status 2.
-#include <openssl/crypto.h>
 #include <openssl/evp.h>
 
 #include <cstdio>
 #include <fstream>
 #include <iostream>
-#include <sstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -38,15 +37,13 @@ int Usage(const std::string& why) {
   return 2;
 }
 
+// Reads straight into a wiping string, since the file may hold a key.
 bool ReadFile(const std::string& path, Groundwork::SecureString* out) {
   std::ifstream in(path, std::ios::binary);
   if (!in) return false;
-  std::ostringstream text;
-  text << in.rdbuf();
-  std::string s = text.str();
-  out->assign(s);
-  OPENSSL_cleanse(s.data(), s.size());
-  return true;
+  out->clear();
+  out->str().assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+  return !in.bad();
 }
 
 bool ParsePort(const std::string& text, uint16_t* port) {

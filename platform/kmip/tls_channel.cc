@@ -171,6 +171,20 @@ Failure TlsChannel::SslFailure(int rc, const std::string& during) {
   return {QLC_E_COMMUNICATION, "TLS failure " + during + (queue.empty() ? "" : ": " + queue)};
 }
 
+int TlsChannel::Repeat(const std::function<int()>& op, const Deadline& deadline,
+                       const std::string& waiting, Failure* wait) {
+  while (true) {
+    ERR_clear_error();
+    errno = 0;
+    int rc = op();
+    if (rc == 1) return 1;
+    int err = SSL_get_error(ssl_.get(), rc);
+    if (err != SSL_ERROR_WANT_READ && err != SSL_ERROR_WANT_WRITE) return rc;
+    *wait = WaitReady(fd_.get(), err == SSL_ERROR_WANT_READ ? POLLIN : POLLOUT, deadline, waiting);
+    if (*wait) return 0;
+  }
+}
+
 Failure TlsChannel::Handshake() {
   ssl_.reset(SSL_new(ctx_.get()));
   BIO* bio = ssl_ ? BIO_new(SocketMethod()) : nullptr;
@@ -180,48 +194,28 @@ Failure TlsChannel::Handshake() {
   if (!IsIpAddress(config_.server.host)) {
     SSL_set_tlsext_host_name(ssl_.get(), config_.server.host.c_str());
   }
-  Deadline deadline(config_.timeoutSeconds);
-  while (true) {
+  Failure wait;
+  int rc = Repeat([this] { return SSL_connect(ssl_.get()); }, Deadline(config_.timeoutSeconds),
+                  "in the TLS handshake", &wait);
+  if (rc == 1) return {};
+  if (wait) return wait;
+  if (!verifyError_.empty()) {
     ERR_clear_error();
-    errno = 0;
-    int rc = SSL_connect(ssl_.get());
-    if (rc == 1) return {};
-    int err = SSL_get_error(ssl_.get(), rc);
-    if (err == SSL_ERROR_WANT_READ || err == SSL_ERROR_WANT_WRITE) {
-      if (Failure f = WaitReady(fd_.get(), err == SSL_ERROR_WANT_READ ? POLLIN : POLLOUT, deadline,
-                                "in the TLS handshake")) {
-        return f;
-      }
-      continue;
-    }
-    if (!verifyError_.empty()) {
-      ERR_clear_error();
-      return {QLC_E_UNTRUSTED_SERVER, "the server's certificate is not trusted: " + verifyError_};
-    }
-    return SslFailure(rc, "in the TLS handshake");
+    return {QLC_E_UNTRUSTED_SERVER, "the server's certificate is not trusted: " + verifyError_};
   }
+  return SslFailure(rc, "in the TLS handshake");
 }
 
 Failure TlsChannel::Send(std::span<const uint8_t> data) {
   Deadline deadline(config_.timeoutSeconds);
   while (!data.empty()) {
-    ERR_clear_error();
-    errno = 0;
     size_t written = 0;
-    int rc = SSL_write_ex(ssl_.get(), data.data(), data.size(), &written);
-    if (rc == 1) {
-      data = data.subspan(written);
-      continue;
-    }
-    int err = SSL_get_error(ssl_.get(), rc);
-    if (err == SSL_ERROR_WANT_READ || err == SSL_ERROR_WANT_WRITE) {
-      if (Failure f = WaitReady(fd_.get(), err == SSL_ERROR_WANT_READ ? POLLIN : POLLOUT, deadline,
-                                "sending the request")) {
-        return f;
-      }
-      continue;
-    }
-    return SslFailure(rc, "while sending the request");
+    Failure wait;
+    int rc = Repeat([&] { return SSL_write_ex(ssl_.get(), data.data(), data.size(), &written); },
+                    deadline, "sending the request", &wait);
+    if (wait) return wait;
+    if (rc != 1) return SslFailure(rc, "while sending the request");
+    data = data.subspan(written);
   }
   return {};
 }
@@ -230,26 +224,18 @@ Failure TlsChannel::ReadExact(uint8_t* out, size_t n, const Deadline& deadline, 
                               size_t total) {
   size_t got = 0;
   while (got < n) {
-    ERR_clear_error();
-    errno = 0;
     size_t read = 0;
-    int rc = SSL_read_ex(ssl_.get(), out + got, n - got, &read);
-    if (rc == 1) {
-      got += read;
-      continue;
+    Failure wait;
+    int rc = Repeat([&] { return SSL_read_ex(ssl_.get(), out + got, n - got, &read); }, deadline,
+                    "waiting for the response", &wait);
+    if (wait) return wait;
+    if (rc != 1) {
+      std::string during = "after " + std::to_string(done_before + got) + " of " +
+                           (total ? std::to_string(total) : std::string("at least 8")) +
+                           " response bytes";
+      return SslFailure(rc, during);
     }
-    int err = SSL_get_error(ssl_.get(), rc);
-    if (err == SSL_ERROR_WANT_READ || err == SSL_ERROR_WANT_WRITE) {
-      if (Failure f = WaitReady(fd_.get(), err == SSL_ERROR_WANT_READ ? POLLIN : POLLOUT, deadline,
-                                "waiting for the response")) {
-        return f;
-      }
-      continue;
-    }
-    std::string during = "after " + std::to_string(done_before + got) + " of " +
-                         (total ? std::to_string(total) : std::string("at least 8")) +
-                         " response bytes";
-    return SslFailure(rc, during);
+    got += read;
   }
   return {};
 }

@@ -3,6 +3,7 @@
 // Not thread-safe: one channel belongs to one session at a time.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <span>
 #include <string>
@@ -38,6 +39,11 @@ class TlsChannel {
   explicit TlsChannel(const SessionConfig& config);
   Failure Setup();
   Failure Handshake();
+  // Repeats `op` (an SSL call that returns 1 on success) while OpenSSL asks
+  // to wait for the socket. Returns 1, the failing return value, or 0 with
+  // `wait` set when the deadline passed while waiting.
+  int Repeat(const std::function<int()>& op, const Deadline& deadline, const std::string& waiting,
+             Failure* wait);
   Failure ReadExact(uint8_t* out, size_t n, const Deadline& deadline, size_t done_before,
                     size_t total);
   Failure SslFailure(int rc, const std::string& during);

@@ -71,4 +71,16 @@ inline Outcome Take(qlc_result* r) {
   return o;
 }
 
+// The texts of the nodes from "Versions/" on.
+inline std::vector<std::string> VersionTexts(const qlc_result* r) {
+  std::vector<std::string> versions;
+  for (const qlc_node* n = qlc_find("Versions/", r); n; n = qlc_next(n)) {
+    char* text = nullptr;
+    if (qlc_value_of(nullptr, n, "%s", &text) != QLC_OK) return {"(unreadable)"};
+    versions.push_back(text);
+    qlc_free(text);
+  }
+  return versions;
+}
+
 }  // namespace KmipTest

@@ -71,13 +71,7 @@ TEST_F(PyKmipTest, VersionsKeysAndStates) {
 
   qlc_result* r = qlc_perform(c.session, "Query, Versions");
   ASSERT_EQ(qlc_ok(r), 0) << qlc_explain(r);
-  std::vector<std::string> versions;
-  for (const qlc_node* n = qlc_find("Versions/", r); n; n = qlc_next(n)) {
-    char* text = nullptr;
-    ASSERT_EQ(qlc_value_of(nullptr, n, "%s", &text), 0);
-    versions.push_back(text);
-    qlc_free(text);
-  }
+  std::vector<std::string> versions = KmipTest::VersionTexts(r);
   qlc_release(r);
   EXPECT_EQ(versions, (std::vector<std::string>{"2.0", "1.4", "1.3", "1.2", "1.1", "1.0"}));
 

@@ -43,13 +43,7 @@ TEST_F(FakeServerTest, VersionsKeyAndStateThroughTheResponsePaths) {
   qlc_result* r = qlc_perform(c.session, "Query, Versions");
   ASSERT_EQ(qlc_ok(r), 0) << qlc_explain(r);
   EXPECT_NE(qlc_find("Versions", r), nullptr);
-  std::vector<std::string> versions;
-  for (const qlc_node* n = qlc_find("Versions/", r); n; n = qlc_next(n)) {
-    char* text = nullptr;
-    ASSERT_EQ(qlc_value_of(nullptr, n, "%s", &text), 0);
-    versions.push_back(text);
-    qlc_free(text);
-  }
+  std::vector<std::string> versions = KmipTest::VersionTexts(r);
   EXPECT_EQ(versions, (std::vector<std::string>{"1.2", "1.1"}));
   qlc_release(r);
 
