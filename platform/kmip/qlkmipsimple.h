@@ -155,7 +155,7 @@ const qlc_node* qlc_find(const char* path, const qlc_handle* from);
 const qlc_node* qlc_next(const qlc_node* node);
 
 /* Overwrites and frees a text or byte buffer from qlc_value_of. NULL is fine;
- * pointers the library did not hand out are ignored. */
+ * pass only pointers that qlc_value_of handed out, each once. */
 void qlc_free(void* pointer);
 
 /* For a connect result that failed with QLC_E_UNTRUSTED_SERVER: sets
