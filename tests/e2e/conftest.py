@@ -6,6 +6,7 @@ import pytest
 sys.path.insert(0, str(pathlib.Path(__file__).parent))
 
 from daemon_process import Daemon  # noqa: E402
+from kmip_server import KmipServer  # noqa: E402
 
 
 @pytest.fixture
@@ -21,3 +22,12 @@ def start_daemon():
     yield start
     for d in started:
         d.kill()
+
+
+@pytest.fixture(scope="module")
+def kmip_server(tmp_path_factory):
+    """A started PyKMIP server shared by the tests of one module."""
+    server = KmipServer(tmp_path_factory.mktemp("kmip"))
+    server.start()
+    yield server
+    server.stop()
