@@ -32,7 +32,7 @@ bool OnlySpace(std::string_view s) {
 
 }  // namespace
 
-bool StandardizePemString(std::string& pem, std::string_view header, std::string_view footer) {
+bool StandardizePemString(std::string_view header, std::string_view footer, std::string& pem) {
   std::string_view headerMarker = TrimRight(header);
   std::string_view footerMarker = TrimRight(footer);
   if (headerMarker.empty() || footerMarker.empty()) return false;

@@ -12,7 +12,7 @@ namespace Kestrel::Common::SslUtils {
 inline constexpr std::string_view kCertificateHeader = "-----BEGIN CERTIFICATE-----";
 inline constexpr std::string_view kCertificateFooter = "-----END CERTIFICATE-----";
 
-// Rewrites one PEM block in `pem` into its standardised form, in place:
+// Rewrites the one PEM block in `pem` into its standardised form, in place:
 //
 //   <header>\n
 //   <base64 of the payload in lines of exactly 64 characters, the last line
@@ -32,7 +32,7 @@ inline constexpr std::string_view kCertificateFooter = "-----END CERTIFICATE----
 // second block, explanatory text), or the payload is empty or not base64.
 // Only the text is checked: whether the bytes are a valid certificate is
 // not.
-bool StandardizePemString(std::string& pem, std::string_view header, std::string_view footer);
+bool StandardizePemString(std::string_view header, std::string_view footer, std::string& pem);
 
 // The public key of the PEM certificate `certPem` as a PEM "PUBLIC KEY"
 // block (SubjectPublicKeyInfo), the form JWT libraries take to verify
