@@ -22,7 +22,7 @@ class WipingResource final : public json::memory_resource {
   }
   void do_deallocate(void* p, size_t size, size_t align) override {
     OPENSSL_cleanse(p, size);
-    ::operator delete(p, size, std::align_val_t(align));
+    ::operator delete(p, std::align_val_t(align));
   }
   bool do_is_equal(const json::memory_resource& other) const noexcept override {
     return this == &other;
