@@ -39,6 +39,15 @@ class ValueReader {
   const char* reading_ = "";
 };
 
+// GetProviderObjects, logging a failure for the whole record.
+int LoadProviderObjects(const std::string& name, ProviderConfigObjects& objects) {
+  int rc = GetProviderObjects(name, objects);
+  if (rc != kStoreOk) {
+    Log_Level(2, "Error getting objects from config store for provider %s\n", name.c_str());
+  }
+  return rc;
+}
+
 // The standardised form of a stored certificate, or the stored text itself
 // (with a warning) when it cannot be standardised.
 std::string StandardizedCertificate(const std::string& stored) {
@@ -138,11 +147,8 @@ int FillClientConfig(const ProviderConfigObjects& objects, ValueReader& r, Kms::
 
 int ReadProviderInfo(const std::string& name, std::shared_ptr<ProvidersSvc::Info>& info) {
   ProviderConfigObjects objects;
-  int rc = GetProviderObjects(name, objects);
-  if (rc != kStoreOk) {
-    Log_Level(2, "Error getting objects from config store for provider %s\n", name.c_str());
-    return rc;
-  }
+  int rc = LoadProviderObjects(name, objects);
+  if (rc != kStoreOk) return rc;
   ValueReader reader;
   auto result = std::make_shared<ProvidersSvc::Info>();
   try {
@@ -156,11 +162,8 @@ int ReadProviderInfo(const std::string& name, std::shared_ptr<ProvidersSvc::Info
 
 int ReadClientConfig(const std::string& name, Kms::KmsInfo& info) {
   ProviderConfigObjects objects;
-  int rc = GetProviderObjects(name, objects);
-  if (rc != kStoreOk) {
-    Log_Level(2, "Error getting objects from config store for provider %s\n", name.c_str());
-    return rc;
-  }
+  int rc = LoadProviderObjects(name, objects);
+  if (rc != kStoreOk) return rc;
   ValueReader reader;
   Kms::KmsInfo result;
   result.name = name;
@@ -206,10 +209,7 @@ int ListProviders(std::vector<std::shared_ptr<ProvidersSvc::Summary>>& providers
 int GetProviderHosts(const std::string& name, bool withServers, bool withProxy,
                      std::vector<std::string>& hosts, std::string& proxyHost) {
   ProviderConfigObjects objects;
-  if (GetProviderObjects(name, objects) != kStoreOk) {
-    Log_Level(2, "Error getting objects from config store for provider %s\n", name.c_str());
-    return kStoreError;
-  }
+  if (LoadProviderObjects(name, objects) != kStoreOk) return kStoreError;
   ValueReader reader;
   std::vector<std::string> serverHosts;
   std::string proxy;

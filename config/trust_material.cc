@@ -10,15 +10,42 @@ using HostCtl::Lib::HostCtlException;
 using OrnaConfigStore::ConfigStoreException;
 using OrnaConfigStore::SubObjectId;
 
+namespace {
+
+// Looks up the provider and its "kmip_server". When `failureFormat` is given,
+// a failure is also logged with it (provider, code).
+int FindKmipServer(const std::string& provider, ConfigStoreObjectPtr& object,
+                   StoreObjectPtr& kmipServer, const char* failureFormat = nullptr) {
+  int rc = GetKmipServerObject(provider, object, kmipServer);
+  if (rc != kStoreOk && failureFormat != nullptr) {
+    Log_Level(2, failureFormat, provider.c_str(), rc);
+  }
+  return rc;
+}
+
+// Stores the changed provider; a failure is logged with `failureFormat`
+// (the exception text) and gives 2.
+int Commit(const ConfigStoreObjectPtr& object, const char* failureFormat) {
+  try {
+    GlobalStore()->UpdateObject(object, 0);
+  } catch (const HostCtlException& e) {
+    ZYRD_LOG_STORE_EXCEPTION(e, failureFormat, e.what());
+    return kStoreError;
+  }
+  return kStoreOk;
+}
+
+constexpr const char* kCsrLookupFailed =
+    "Unable to find provider or kmip server config for %s: %d\n";
+
+}  // namespace
+
 int GetCredential(const std::string& provider, std::string& credential) {
   ConfigStoreObjectPtr object;
   StoreObjectPtr kmipServer;
-  int rc = GetKmipServerObject(provider, object, kmipServer);
-  if (rc != kStoreOk) {
-    Log_Level(2, "Get credential could not find kmip server for provider %s: %d\n",
-              provider.c_str(), rc);
-    return rc;
-  }
+  int rc = FindKmipServer(provider, object, kmipServer,
+                          "Get credential could not find kmip server for provider %s: %d\n");
+  if (rc != kStoreOk) return rc;
   Log_Level(6, "Getting credential for the provider %s\n", provider.c_str());
   try {
     kmipServer->GetValue("credential", &credential);
@@ -33,28 +60,19 @@ int GetCredential(const std::string& provider, std::string& credential) {
 int SetCredential(const std::string& provider, const std::string& credential) {
   ConfigStoreObjectPtr object;
   StoreObjectPtr kmipServer;
-  int rc = GetKmipServerObject(provider, object, kmipServer);
-  if (rc != kStoreOk) {
-    Log_Level(2, "Set credential could not find kmip server for provider %s: %d\n",
-              provider.c_str(), rc);
-    return rc;
-  }
+  int rc = FindKmipServer(provider, object, kmipServer,
+                          "Set credential could not find kmip server for provider %s: %d\n");
+  if (rc != kStoreOk) return rc;
   Log_Level(6, "Setting credential for the provider %s\n", provider.c_str());
-  try {
-    kmipServer->SetValue("credential", credential);
-    GlobalStore()->UpdateObject(object, 0);
-  } catch (const HostCtlException& e) {
-    ZYRD_LOG_STORE_EXCEPTION(e, "Set credential failed to write to configstore: %s\n", e.what());
-    return kStoreError;
-  }
-  return kStoreOk;
+  kmipServer->SetValue("credential", credential);
+  return Commit(object, "Set credential failed to write to configstore: %s\n");
 }
 
 int GetClientCertificate(const std::string& provider, std::string& certificate,
                          std::string& privateKey) {
   ConfigStoreObjectPtr object;
   StoreObjectPtr kmipServer;
-  int rc = GetKmipServerObject(provider, object, kmipServer);
+  int rc = FindKmipServer(provider, object, kmipServer);
   if (rc != kStoreOk) return rc;
   StoreObjectPtr clientCert = kmipServer->GetSubObject(SubObjectId(kClientCertificate));
   if (!clientCert) {
@@ -77,7 +95,7 @@ int SetClientCertificate(const std::string& provider, const std::string& certifi
                          const std::string& privateKey) {
   ConfigStoreObjectPtr object;
   StoreObjectPtr kmipServer;
-  int rc = GetKmipServerObject(provider, object, kmipServer);
+  int rc = FindKmipServer(provider, object, kmipServer);
   if (rc != kStoreOk) return rc;
   StoreObjectPtr clientCert = kmipServer->GetSubObject(SubObjectId(kClientCertificate));
   if (!clientCert) {
@@ -92,24 +110,14 @@ int SetClientCertificate(const std::string& provider, const std::string& certifi
   }
   clientCert->SetValue("certificate", certificate);
   clientCert->SetValue("private_key", privateKey);
-  try {
-    GlobalStore()->UpdateObject(object, 0);
-  } catch (const HostCtlException& e) {
-    ZYRD_LOG_STORE_EXCEPTION(e, "Error writing client certificate to configstore: %s\n", e.what());
-    return kStoreError;
-  }
-  return kStoreOk;
+  return Commit(object, "Error writing client certificate to configstore: %s\n");
 }
 
 int GetClientCsr(const std::string& provider, std::string& csr, std::string& privateKey) {
   ConfigStoreObjectPtr object;
   StoreObjectPtr kmipServer;
-  int rc = GetKmipServerObject(provider, object, kmipServer);
-  if (rc != kStoreOk) {
-    Log_Level(2, "Unable to find provider or kmip server config for %s: %d\n", provider.c_str(),
-              rc);
-    return rc;
-  }
+  int rc = FindKmipServer(provider, object, kmipServer, kCsrLookupFailed);
+  if (rc != kStoreOk) return rc;
   StoreObjectPtr clientCsr;
   try {
     clientCsr = kmipServer->GetSubObject(SubObjectId(kClientCsr));
@@ -130,12 +138,8 @@ int SetClientCsr(const std::string& provider, const std::string& csr,
                  const std::string& privateKey) {
   ConfigStoreObjectPtr object;
   StoreObjectPtr kmipServer;
-  int rc = GetKmipServerObject(provider, object, kmipServer);
-  if (rc != kStoreOk) {
-    Log_Level(2, "Unable to find provider or kmip server config for %s: %d\n", provider.c_str(),
-              rc);
-    return rc;
-  }
+  int rc = FindKmipServer(provider, object, kmipServer, kCsrLookupFailed);
+  if (rc != kStoreOk) return rc;
   StoreObjectPtr clientCsr;
   try {
     clientCsr = kmipServer->GetSubObject(SubObjectId(kClientCsr));
@@ -177,13 +181,7 @@ int SetServerCertificates(const std::string& provider,
   int rc = GetKeyServerObject(provider, object, keyServer);
   if (rc != kStoreOk) return rc;
   keyServer->SetValue("server_cert", certificates);
-  try {
-    GlobalStore()->UpdateObject(object, 0);
-  } catch (const HostCtlException& e) {
-    ZYRD_LOG_STORE_EXCEPTION(e, "Error writing to configstore: %s\n", e.what());
-    return kStoreError;
-  }
-  return kStoreOk;
+  return Commit(object, "Error writing to configstore: %s\n");
 }
 
 }  // namespace Zyrd::Config

@@ -28,49 +28,43 @@ class ThrowingStore : public ConfigStore {
   explicit ThrowingStore(std::shared_ptr<ConfigStore> real) : real_(std::move(real)) {}
   void FailOn(Op op) { failing_.insert(op); }
 
+  template <typename Call>
+  auto Run(Op op, Call call) {
+    if (failing_.count(op) != 0) throw ConfigStoreException(kInjected);
+    return call();
+  }
+
   ConfigStoreObjectPtr GetObject(const ConfigStoreObjectId& id) override {
-    Check(kGet);
-    return real_->GetObject(id);
+    return Run(kGet, [&] { return real_->GetObject(id); });
   }
   void WriteObject(const ConfigStoreObjectPtr& o, int options) override {
-    Check(kWrite);
-    real_->WriteObject(o, options);
+    Run(kWrite, [&] { real_->WriteObject(o, options); });
   }
   void UpdateObject(const ConfigStoreObjectPtr& o, int options) override {
-    Check(kUpdate);
-    real_->UpdateObject(o, options);
+    Run(kUpdate, [&] { real_->UpdateObject(o, options); });
   }
   bool DeleteObject(const ConfigStoreObjectId& id) override {
-    Check(kDelete);
-    return real_->DeleteObject(id);
+    return Run(kDelete, [&] { return real_->DeleteObject(id); });
   }
   std::vector<ConfigStoreObjectPtr> GetObjectsByFilter(const FilterSpecObject& f) override {
-    Check(kFilter);
-    return real_->GetObjectsByFilter(f);
+    return Run(kFilter, [&] { return real_->GetObjectsByFilter(f); });
   }
   std::string Export(const std::vector<FilterSpecObject>& filters) override {
-    Check(kExport);
-    return real_->Export(filters);
+    return Run(kExport, [&] { return real_->Export(filters); });
   }
   bool Import(const std::string& text, std::vector<ErrorInfo>& errors) override {
-    Check(kImport);
-    return real_->Import(text, errors);
+    return Run(kImport, [&] { return real_->Import(text, errors); });
   }
   std::vector<ConfigStoreObjectPtr> GetDesiredUserConfigInstances(const ConfigStoreObjectId& id,
                                                                   int flags) override {
-    Check(kDesired);
-    return real_->GetDesiredUserConfigInstances(id, flags);
+    return Run(kDesired, [&] { return real_->GetDesiredUserConfigInstances(id, flags); });
   }
   void SetBootStatus(const ConfigStoreObjectId& id, bool restored) override {
-    Check(kBootStatus);
-    real_->SetBootStatus(id, restored);
+    Run(kBootStatus, [&] { real_->SetBootStatus(id, restored); });
   }
   bool GetBootStatus(const ConfigStoreObjectId& id) override { return real_->GetBootStatus(id); }
 
  private:
-  void Check(Op op) const {
-    if (failing_.count(op) != 0) throw ConfigStoreException(kInjected);
-  }
   std::shared_ptr<ConfigStore> real_;
   std::set<Op> failing_;
 };
@@ -112,6 +106,13 @@ class ConfigTest : public ::testing::Test {
     ASSERT_EQ(Zyrd::Config::GetProviderObjects(name, o), 0);
     change(o);
     real_->WriteObject(o.provider, 0);
+  }
+
+  // The error line about an injected exception and the daemon logger's copy
+  // of its text.
+  void ExpectInjected(const std::string& prefix) {
+    EXPECT_TRUE(log_.Has(2, prefix + kInjected + "\n")) << prefix;
+    EXPECT_TRUE(log_.Has(3, std::string("zyrdLogger: ") + kInjected + "\n"));
   }
 
   std::string ExportAll() {

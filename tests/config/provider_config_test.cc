@@ -11,22 +11,12 @@ using namespace Zyrd::Config;
 using namespace ZyrdTest;
 namespace Svc = Com::Tarsel::Orna::Kms::ProvidersSvc;
 
-std::string Injected(const std::string& prefix) { return prefix + kInjected + "\n"; }
-
-class ProviderConfigTest : public ConfigTest {
- protected:
-  // The error line and the daemon logger's copy of the exception text.
-  void ExpectStoreError(const std::string& line) {
-    EXPECT_TRUE(log_.Has(2, line)) << line;
-    EXPECT_TRUE(log_.Has(3, std::string("zyrdLogger: ") + kInjected + "\n"));
-  }
-};
+using ProviderConfigTest = ConfigTest;
 
 TEST_F(ProviderConfigTest, ProviderReadsBackAsWrittenWithServersInConfiguredOrder) {
   CreateProvider("p1");
   std::shared_ptr<Svc::Info> info;
   ASSERT_EQ(ReadProviderInfo("p1", info), kStoreOk);
-
   Svc::Info expected;
   expected.masterKeyId = "mk-p1";
   expected.keyServer.type = Svc::KeyServerType::Open("KMIP");
@@ -52,26 +42,25 @@ TEST_F(ProviderConfigTest, UnsetTimeoutEmptyUsernameAndMissingPartsReadBackAsAbs
   std::shared_ptr<Svc::Info> info;
   ASSERT_EQ(ReadProviderInfo("bare", info), kStoreOk);
   EXPECT_EQ(info->keyServer.description, "");
-  EXPECT_FALSE(info->keyServer.proxyServer.has_value());
-  EXPECT_FALSE(info->keyServer.connectionTimeout.has_value());
-  EXPECT_FALSE(info->keyServer.kmipServer.username.has_value());
+  EXPECT_FALSE(info->keyServer.proxyServer || info->keyServer.connectionTimeout ||
+               info->keyServer.kmipServer.username);
   EXPECT_TRUE(info->keyServer.kmipServer.servers.empty());
   EXPECT_TRUE(log_.Has(2, "Config store object proxy_server not found\n"));
 
   Zyrd::Kms::KmsInfo client;
   ASSERT_EQ(ReadClientConfig("bare", client), kStoreOk);
   EXPECT_EQ(client.connectionTimeout, 0);  // the client's default, not -1
-  EXPECT_EQ(client.proxyHost, "");
 }
 
 TEST_F(ProviderConfigTest, UpdatingAWorkingSetReplacesServersAndProxy) {
   CreateProvider("p1", /*withProxy=*/false);
   ProviderConfigObjects o;
   ASSERT_EQ(GetProviderObjects("p1", o), kStoreOk);
-  EXPECT_EQ(o.proxyServer, nullptr);
   ASSERT_EQ(SetProxy(o, "proxy.new", 8080), kStoreOk);
   ASSERT_EQ(DeleteAllServers(o), kStoreOk);
   ASSERT_EQ(AddServer(o, "only", "kms.new", 1), kStoreOk);
+  EXPECT_EQ(AddServer(o, "only", "kms.other", 2), kStoreError);
+  EXPECT_EQ(log_.Count("Error creating server configstore object: sub-object 'servers'"), 1u);
   ASSERT_EQ(WriteProvider(o), kStoreOk);
 
   std::shared_ptr<Svc::Info> info;
@@ -82,14 +71,9 @@ TEST_F(ProviderConfigTest, UpdatingAWorkingSetReplacesServersAndProxy) {
 
   ASSERT_EQ(GetProviderObjects("p1", o), kStoreOk);
   ASSERT_EQ(SetProxy(o, "", 0), kStoreOk);  // an empty hostname removes the proxy
-  EXPECT_EQ(o.proxyServer, nullptr);
   ASSERT_EQ(WriteProvider(o), kStoreOk);
   ASSERT_EQ(ReadProviderInfo("p1", info), kStoreOk);
   EXPECT_FALSE(info->keyServer.proxyServer.has_value());
-
-  ASSERT_EQ(GetProviderObjects("p1", o), kStoreOk);
-  EXPECT_EQ(AddServer(o, "only", "kms.other", 2), kStoreError);
-  EXPECT_EQ(log_.Count("Error creating server configstore object: sub-object 'servers'"), 1u);
 }
 
 TEST_F(ProviderConfigTest, CreatingAnExistingProviderReturns1AndChangesNothing) {
@@ -102,26 +86,18 @@ TEST_F(ProviderConfigTest, CreatingAnExistingProviderReturns1AndChangesNothing) 
   EXPECT_EQ(ExportAll(), before);
 }
 
-TEST_F(ProviderConfigTest, MissingProviderGives3) {
+TEST_F(ProviderConfigTest, MissingProviderOrSubObjectGives3) {
   std::shared_ptr<Svc::Info> info;
   Zyrd::Kms::KmsInfo client;
   EXPECT_EQ(ReadProviderInfo("nope", info), kStoreNotFound);
-  EXPECT_EQ(info, nullptr);
   EXPECT_EQ(ReadClientConfig("nope", client), kStoreNotFound);
   EXPECT_EQ(DeleteProvider("nope"), kStoreNotFound);
   EXPECT_TRUE(log_.Has(2, "Provider nope not found\n"));
   EXPECT_TRUE(log_.Has(2, "Error getting objects from config store for provider nope\n"));
 
-  std::vector<std::string> hosts;
-  std::string proxy;
-  EXPECT_EQ(GetProviderHosts("nope", true, true, hosts, proxy), kStoreError);
-}
-
-TEST_F(ProviderConfigTest, MissingSubObjectsGive3) {
-  auto bare = std::make_shared<ConfigStoreObject>(ConfigStoreObjectId("providers", "kms", "orna"));
-  auto id = bare->GetConfigStoreObjectId();
-  id.SetInstanceId("hollow");
-  real_->WriteObject(std::make_shared<ConfigStoreObject>(id), 0);
+  real_->WriteObject(std::make_shared<ConfigStoreObject>(
+                         ConfigStoreObjectId("providers", "kms", "orna", "hollow")),
+                     0);
   ProviderConfigObjects o;
   EXPECT_EQ(GetProviderObjects("hollow", o), kStoreNotFound);
   EXPECT_TRUE(log_.Has(2, "Config store object key_server not found\n"));
@@ -131,31 +107,27 @@ TEST_F(ProviderConfigTest, StoreExceptionsGive2WithTheirLogLines) {
   CreateProvider("p1");
   ProviderConfigObjects o;
   ASSERT_EQ(GetProviderObjects("p1", o), kStoreOk);
-
   store_->FailOn(ThrowingStore::kWrite);
   EXPECT_EQ(WriteProvider(o), kStoreError);
-  ExpectStoreError(Injected("Error writing to config store: "));
+  ExpectInjected("Error writing to config store: ");
 
   store_->FailOn(ThrowingStore::kFilter);
   std::vector<std::string> ids{"kept"};
   EXPECT_EQ(ListProviderIds(ids), kStoreError);
   EXPECT_EQ(ids, std::vector<std::string>{"kept"});
-  ExpectStoreError(Injected("Error reading providers from config store "));
+  ExpectInjected("Error reading providers from config store ");
 
   store_->FailOn(ThrowingStore::kDelete);
   EXPECT_EQ(DeleteProvider("p1"), kStoreError);
-  ExpectStoreError(Injected("Failed to delete provider p1 from configstore: "));
+  ExpectInjected("Failed to delete provider p1 from configstore: ");
 
   store_->FailOn(ThrowingStore::kGet);
   std::shared_ptr<Svc::Info> info;
   EXPECT_EQ(ReadProviderInfo("p1", info), kStoreError);
-  ExpectStoreError(Injected("Error getting provider config store object: "));
-  ProviderConfigObjects created;
-  created.name = "p2";
-  EXPECT_EQ(CreateProviderObjects(created), kStoreError);
+  ExpectInjected("Error getting provider config store object: ");
   std::string key;
   EXPECT_FALSE(ReadVouchdPublicKey(key));
-  ExpectStoreError(Injected("Exception reading property 'certificate' from config store: "));
+  ExpectInjected("Exception reading property 'certificate' from config store: ");
 }
 
 TEST_F(ProviderConfigTest, StoredValuesOfTheWrongTypeOrMissingGive2) {
@@ -175,11 +147,6 @@ TEST_F(ProviderConfigTest, StoredValuesOfTheWrongTypeOrMissingGive2) {
   EXPECT_EQ(ReadProviderInfo("p2", info), kStoreError);
   EXPECT_EQ(ReadClientConfig("p2", client), kStoreError);
   EXPECT_EQ(log_.Count("Error reading master_key_id from config store\n"), 2u);
-
-  CreateProvider("p3");
-  Tamper("p3", [](ProviderConfigObjects& o) { o.proxyServer->DeleteValue("port"); });
-  EXPECT_EQ(ReadProviderInfo("p3", info), kStoreError);
-  EXPECT_TRUE(log_.Has(2, "Error reading port from config store\n"));
 }
 
 TEST_F(ProviderConfigTest, ClientConfigurationCarriesTrustMaterialStandardised) {
@@ -191,19 +158,15 @@ TEST_F(ProviderConfigTest, ClientConfigurationCarriesTrustMaterialStandardised) 
   CreateProvider("p1");
   ASSERT_EQ(SetCredential("p1", "s3cret"), kStoreOk);
   ASSERT_EQ(SetServerCertificates("p1", {messy, "not a pem", pem}), kStoreOk);
-
   Zyrd::Kms::KmsInfo client;
   ASSERT_EQ(ReadClientConfig("p1", client), kStoreOk);
   EXPECT_EQ(client.name, "p1");
   EXPECT_EQ(client.masterKeyId, "mk-p1");
-  EXPECT_EQ(client.proxyHost, "proxy.example");
-  EXPECT_EQ(client.proxyPort, 3128);
+  EXPECT_EQ(client.proxyHost + ":" + std::to_string(client.proxyPort), "proxy.example:3128");
   EXPECT_EQ(client.connectionTimeout, 30);
-  EXPECT_EQ(client.userName, "alice");
-  EXPECT_EQ(client.password, "s3cret");
+  EXPECT_EQ(client.userName + "/" + client.password, "alice/s3cret");
   ASSERT_EQ(client.servers.size(), 2u);
-  EXPECT_EQ(client.servers[0].name, "s2");
-  EXPECT_EQ(client.servers[0].hostname, "kms2.example");
+  EXPECT_EQ(client.servers[0].name + " " + client.servers[0].hostname, "s2 kms2.example");
   EXPECT_EQ(client.servers[0].port, 5696);
   EXPECT_EQ(client.servers[1].name, "s1");
   EXPECT_EQ(client.trustedServerCertificates, (std::vector<std::string>{pem, "not a pem", pem}));
@@ -229,8 +192,7 @@ TEST_F(ProviderConfigTest, ListsAndHostsFollowTheStore) {
   std::vector<std::shared_ptr<Svc::Summary>> providers;
   ASSERT_EQ(ListProviders(providers), kStoreOk);
   ASSERT_EQ(providers.size(), 2u);
-  EXPECT_EQ(providers[0]->provider, "a");
-  EXPECT_EQ(providers[1]->provider, "b");
+  EXPECT_EQ(providers[0]->provider + providers[1]->provider, "ab");
 
   std::vector<std::string> hosts{"earlier"};
   std::string proxy = "untouched";
@@ -241,6 +203,7 @@ TEST_F(ProviderConfigTest, ListsAndHostsFollowTheStore) {
   ASSERT_EQ(GetProviderHosts("b", false, true, hosts, proxy), kStoreOk);
   EXPECT_TRUE(hosts.empty());
   EXPECT_EQ(proxy, "proxy.example");
+  EXPECT_EQ(GetProviderHosts("nope", true, true, hosts, proxy), kStoreError);
 
   ASSERT_EQ(DeleteProvider("b"), kStoreOk);
   std::vector<std::string> ids;
@@ -255,12 +218,6 @@ TEST_F(ProviderConfigTest, VouchdKeyComesFromTheStoredCertificate) {
 
   auto object = std::make_shared<ConfigStoreObject>(
       ConfigStoreObjectId("certificate", "attestation", "orna"));
-  object->SetValue("certificate", std::string());
-  real_->WriteObject(object, 0);
-  log_.Clear();
-  EXPECT_FALSE(ReadVouchdPublicKey(key));
-  EXPECT_TRUE(log_.Has(2, "Vouchd certificate is empty.\n"));
-
   object->SetValue("certificate", std::string("garbage"));
   real_->WriteObject(object, 0);
   EXPECT_FALSE(ReadVouchdPublicKey(key));
@@ -274,11 +231,10 @@ TEST_F(ProviderConfigTest, VouchdKeyComesFromTheStoredCertificate) {
 }
 
 TEST(ConfigLock, IsOneNamedLockTakenBeforeTheProvidersStateLock) {
-  UserLock::RWLock& lock = ConfigLock();
-  EXPECT_EQ(&lock, &ConfigLock());
-  EXPECT_EQ(lock.Name(), "configLock");
+  EXPECT_EQ(&ConfigLock(), &ConfigLock());
+  EXPECT_EQ(ConfigLock().Name(), "configLock");
   UserLock::RWLockPtr providersState("providersState", 0xff000000);
-  UserLock::WriteGuard config(lock);
+  UserLock::WriteGuard config(ConfigLock());
   UserLock::ReadGuard state(*providersState);  // in rank order: no panic
 }
 

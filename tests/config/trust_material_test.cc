@@ -13,10 +13,6 @@ class TrustMaterialTest : public ConfigTest {
     ConfigTest::SetUp();
     CreateProvider("p1");
   }
-  void ExpectInjected(const std::string& prefix) {
-    EXPECT_TRUE(log_.Has(2, prefix + kInjected + "\n")) << prefix;
-    EXPECT_TRUE(log_.Has(3, std::string("zyrdLogger: ") + kInjected + "\n"));
-  }
 };
 
 TEST_F(TrustMaterialTest, EveryOperationOnAMissingProviderGives3) {

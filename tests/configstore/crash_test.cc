@@ -8,7 +8,6 @@
 #include <chrono>
 #include <cstdint>
 #include <map>
-#include <optional>
 #include <random>
 #include <thread>
 
