@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 
+#include "config/config_transfer.h"
 #include "daemon/logger.h"
 #include "daemon/settings.h"
 #include "daemon/stats.h"
@@ -81,6 +82,8 @@ void RunDaemon() {
 
     ZyrApi::GetDaemonLogger();
     auto loggerWrapper = std::make_shared<ZyrApi::LumoLoggerWrapper>(&Log_Level);
+
+    Config::RestoreConfig();
 
     auto localizer = std::make_shared<const Lumo::L10n::Localizer>(
         std::vector<std::string>{"en_US"}, ZyrApi::ResolveMessage);
