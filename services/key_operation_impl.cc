@@ -54,7 +54,7 @@ KeyOperationImpl::KeyOperationImpl(std::shared_ptr<Zyrd::State::ProviderLookup> 
 
 void KeyOperationImpl::generate_key(const std::string& provider, int64_t keySize,
                                     ::Lumo::AsyncResult<GeneratedKey> result) {
-  const uint64_t start = Zyrd::Stats::NowUs();
+  const uint64_t start = stats_.NowUs();
   auto fail = [&](::Lumo::Data::ErrorValuePtr error) {
     result.SetError(std::move(error));
     stats_.Record(false, start);
@@ -97,7 +97,7 @@ void KeyOperationImpl::encrypt(::Lumo::AsyncResult<EncryptResult> result) {
 
 void KeyOperationImpl::decrypt(const std::string& provider, const std::string& wrappedKey,
                                ::Lumo::AsyncResult<DecryptResult> result) {
-  const uint64_t start = Zyrd::Stats::NowUs();
+  const uint64_t start = stats_.NowUs();
   auto fail = [&](::Lumo::Data::ErrorValuePtr error) {
     result.SetError(std::move(error));
     stats_.Record(false, start);
