@@ -11,12 +11,20 @@ namespace {
 
 class WipingResource final : public boost::json::memory_resource {
  private:
+  // Boost.JSON asks for at most the default alignment, which plain new
+  // gives; the aligned forms are there for anything stricter.
+  static bool Plain(std::size_t align) { return align <= __STDCPP_DEFAULT_NEW_ALIGNMENT__; }
+
   void* do_allocate(std::size_t bytes, std::size_t align) override {
-    return ::operator new(bytes, std::align_val_t(align));
+    return Plain(align) ? ::operator new(bytes) : ::operator new(bytes, std::align_val_t(align));
   }
   void do_deallocate(void* p, std::size_t bytes, std::size_t align) override {
     OPENSSL_cleanse(p, bytes);
-    ::operator delete(p, bytes, std::align_val_t(align));
+    if (Plain(align)) {
+      ::operator delete(p);
+    } else {
+      ::operator delete(p, std::align_val_t(align));
+    }
   }
   bool do_is_equal(const memory_resource& other) const noexcept override { return this == &other; }
 };
