@@ -2,10 +2,14 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdio>
+#include <fstream>
+
 #include "errors/error_builders.h"
 #include "tests/api/token_signer.h"
 #include "tests/support/fakes.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/temp_dir.h"
 
 namespace {
 
@@ -129,6 +133,53 @@ TEST_F(KmsAuthTokenHandlerTest, Hs256IsRefusedEvenWhenItsSignatureChecks) {
       TokenBuilder::Valid(kNow).Encode(JWT_ALG_HS256, ZyrdTest::VouchdKey().publicPem);
   EXPECT_EQ(Check(token), kRefused);
   EXPECT_TRUE(log_.Has(2, "Token algorithm is invalid: 1\n"));
+}
+
+}  // namespace
+
+namespace {
+
+std::string RunTool(const std::string& command) {
+  std::string out;
+  FILE* pipe = popen(command.c_str(), "r");
+  if (pipe == nullptr) return out;
+  char buffer[4096];
+  size_t n;
+  while ((n = fread(buffer, 1, sizeof(buffer), pipe)) > 0) out.append(buffer, n);
+  pclose(pipe);
+  while (!out.empty() && out.back() == '\n') out.pop_back();
+  return out;
+}
+
+// The developer tools make keys and tokens this handler accepts.
+TEST(AttestationToolsTest, MintedTokenIsAcceptedWithTheMadeKey) {
+  ZyrdTest::TempDir dir;
+  const std::string tools = std::string(ZYRD_SOURCE_DIR) + "/tools/";
+  RunTool(tools + "make-attestation-key " + dir.Path());
+  std::ifstream in(dir / "attestation-pubkey.pem");
+  std::string publicKey((std::istreambuf_iterator<char>(in)), {});
+  ASSERT_NE(publicKey.find("BEGIN PUBLIC KEY"), std::string::npos);
+
+  Zyrd::Authn::KmsAuthTokenHandler handler(
+      [&](std::string& key) {
+        key = publicKey;
+        return true;
+      },
+      Groundwork::SystemClock());
+  auto check = [&](const std::string& args) {
+    Lumo::Core::AsyncActivation activation;
+    activation.securityContext.scheme = Lumo::Core::SecurityContext::kOAuthScheme;
+    activation.securityContext.accessToken.assign(
+        RunTool(tools + "mint-attestation-token --key " + (dir / "attestation-key.pem") + args));
+    std::string out;
+    handler.Authenticate(activation, [&](Lumo::Authn::AuthnOutcome o) {
+      out = o.result ? "accepted" : o.error ? "refused" : "none";
+    });
+    return out;
+  };
+  EXPECT_EQ(check(""), "accepted");
+  EXPECT_EQ(check(" --ttl -10"), "refused");
+  EXPECT_EQ(check(" --aud other"), "refused");
 }
 
 }  // namespace
