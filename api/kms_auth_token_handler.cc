@@ -1,7 +1,9 @@
 #include "api/kms_auth_token_handler.h"
 
 #include <jwt.h>
+#include <openssl/sha.h>
 
+#include <algorithm>
 #include <memory>
 
 #include "errors/error_builders.h"
@@ -18,8 +20,8 @@ using JwtPtr = std::unique_ptr<jwt_t, JwtFree>;
 constexpr uint32_t kAuthLockRank = 0xff000000;
 
 // Checks a token whose signature verified: the first failing check logs its
-// line and returns false.
-bool CheckClaims(jwt_t* jwt, int64_t nowSeconds) {
+// line and returns false. `exp` receives the token's expiry.
+bool CheckClaims(jwt_t* jwt, int64_t nowSeconds, int64_t& expOut) {
   jwt_alg_t alg = jwt_get_alg(jwt);
   if (alg != JWT_ALG_RS256) {
     Log_Level(2, "Token algorithm is invalid: %d\n", static_cast<int>(alg));
@@ -27,6 +29,7 @@ bool CheckClaims(jwt_t* jwt, int64_t nowSeconds) {
   }
   long exp = jwt_get_grant_int(jwt, "exp");
   if (exp < 0) exp = 0;
+  expOut = exp;
   if (exp < nowSeconds) {
     Log_Level(2, "Token is expired\n");
     return false;
@@ -47,7 +50,34 @@ bool CheckClaims(jwt_t* jwt, int64_t nowSeconds) {
 }  // namespace
 
 KmsAuthTokenHandler::KmsAuthTokenHandler(KeyReader readKey, const Groundwork::Clock& clock)
-    : readKey_(std::move(readKey)), clock_(clock), lock_("kms-auth-lock", kAuthLockRank) {}
+    : readKey_(std::move(readKey)),
+      clock_(clock),
+      lock_("kms-auth-lock", kAuthLockRank),
+      rememberedLock_("kms-auth-tokens", kAuthLockRank) {}
+
+bool KmsAuthTokenHandler::Remembered(const Digest& digest, int64_t nowSeconds) {
+  UserLock::ReadGuard read(*rememberedLock_);
+  auto it = remembered_.find(digest);
+  return it != remembered_.end() && it->second >= nowSeconds;
+}
+
+void KmsAuthTokenHandler::Remember(const Digest& digest, int64_t exp, int64_t nowSeconds) {
+  UserLock::WriteGuard write(*rememberedLock_);
+  if (remembered_.size() >= kMaxRememberedTokens) {
+    std::erase_if(remembered_, [&](const auto& entry) { return entry.second < nowSeconds; });
+    if (remembered_.size() >= kMaxRememberedTokens) remembered_.clear();
+  }
+  remembered_[digest] = exp;
+}
+
+void KmsAuthTokenHandler::Accept(std::string_view token, Lumo::Authn::AuthnCallback& done) const {
+  auto result = std::make_shared<Lumo::Authn::AuthenticationResult>();
+  result->name = kResultName;
+  result->accessToken.assign(token);
+  result->username = kUsername;
+  result->entitlements = {kEntitlement};
+  done({std::move(result), nullptr});
+}
 
 bool KmsAuthTokenHandler::EnsureKey() {
   {
@@ -78,6 +108,15 @@ void KmsAuthTokenHandler::Authenticate(const Lumo::Core::AsyncActivation& activa
     done({});
     return;
   }
+  const int64_t now = clock_.RealtimeUs() / 1000000;
+  Digest digest;
+  SHA256(reinterpret_cast<const unsigned char*>(reader.accessToken().data()),
+         reader.accessToken().size(), digest.data());
+  if (Remembered(digest, now)) {
+    Accept(reader.accessToken(), done);
+    return;
+  }
+
   // The context's token is NUL-terminated: it lives in a string.
   const char* token = activation.securityContext.accessToken.data();
   JwtPtr jwt;
@@ -94,7 +133,8 @@ void KmsAuthTokenHandler::Authenticate(const Lumo::Core::AsyncActivation& activa
     done({});
     return;
   }
-  if (!CheckClaims(jwt.get(), clock_.RealtimeUs() / 1000000)) {
+  int64_t exp = 0;
+  if (!CheckClaims(jwt.get(), now, exp)) {
     Log_Level(2, "Attestation token validation failed\n");
     Lumo::NamedMessageBuilder message("com.tarsel.orna.kms.authentication.invalid_token");
     const Lumo::L10n::Localizer& localizer = activation.requestLocalizer != nullptr
@@ -107,12 +147,8 @@ void KmsAuthTokenHandler::Authenticate(const Lumo::Core::AsyncActivation& activa
     return;
   }
   jwt.reset();
-  auto result = std::make_shared<Lumo::Authn::AuthenticationResult>();
-  result->name = kResultName;
-  result->accessToken.assign(reader.accessToken());
-  result->username = kUsername;
-  result->entitlements = {kEntitlement};
-  done({std::move(result), nullptr});
+  Remember(digest, exp, now);
+  Accept(reader.accessToken(), done);
 }
 
 }  // namespace Zyrd::Authn

@@ -13,11 +13,22 @@
 //    token signed by vouchd that fails a check (algorithm RS256, "exp" not
 //    before now, "iss" containing "/attestation", "aud" starting "zyrd");
 //  - the authentication result otherwise.
+//
+// Checking a signature costs far more than the rest of a call, and a caller
+// normally presents the same token for many calls. Tokens that passed every
+// check are therefore remembered (by SHA-256 digest, with their expiry): a
+// remembered token is accepted again without decoding while its "exp" is not
+// before the current second; once it is, the token takes the full path again
+// and is refused there as expired. Nothing else is remembered, so every
+// refusal and its log lines are those of the full check.
 // Thread-safe.
 #pragma once
 
+#include <array>
 #include <functional>
+#include <map>
 #include <string>
+#include <string_view>
 
 #include "platform/lumo/authn.h"
 #include "platform/util/hostinfo.h"
@@ -42,13 +53,24 @@ class KmsAuthTokenHandler : public Lumo::Authn::AuthnHandler {
                     Lumo::Authn::AuthnCallback done) override;
 
  private:
+  // At most this many tokens are remembered; when full, expired ones are
+  // dropped, and if none has expired, all are.
+  static constexpr size_t kMaxRememberedTokens = 4096;
+
+  using Digest = std::array<unsigned char, 32>;
+
   // Fills the key cache when it is empty; false when no key is available.
   bool EnsureKey();
+  bool Remembered(const Digest& digest, int64_t nowSeconds);
+  void Remember(const Digest& digest, int64_t exp, int64_t nowSeconds);
+  void Accept(std::string_view token, Lumo::Authn::AuthnCallback& done) const;
 
   KeyReader readKey_;
   const Groundwork::Clock& clock_;
   UserLock::RWLockPtr lock_;
   std::string key_;  // guarded by lock_
+  UserLock::RWLockPtr rememberedLock_;
+  std::map<Digest, int64_t> remembered_;  // digest -> "exp"; guarded by rememberedLock_
 };
 
 }  // namespace Zyrd::Authn

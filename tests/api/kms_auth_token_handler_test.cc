@@ -105,6 +105,16 @@ TEST_F(KmsAuthTokenHandlerTest, ExpiryIsComparedInWholeSeconds) {
   EXPECT_EQ(log_.Count("Token is expired"), 3u);
 }
 
+TEST_F(KmsAuthTokenHandlerTest, AnAcceptedTokenStillExpires) {
+  std::string token = TokenBuilder::Valid(kNow).Exp(kNow + 10).Sign();
+  EXPECT_EQ(Check(token), "accepted");
+  clock_.SetRealtimeUs((kNow + 10) * 1'000'000 + 999'999);
+  EXPECT_EQ(Check(token), "accepted");
+  clock_.SetRealtimeUs((kNow + 11) * 1'000'000);
+  EXPECT_EQ(Check(token), kRefused);
+  EXPECT_TRUE(log_.Has(2, "Token is expired\n"));
+}
+
 TEST_F(KmsAuthTokenHandlerTest, IssuerMustContainAttestationAnywhere) {
   for (const char* iss : {"/attestation", "https://h/attestation/v1", "x/attestation"}) {
     EXPECT_EQ(Check(TokenBuilder::Valid(kNow).Remove("iss").Claim("iss", iss).Sign()), "accepted")
