@@ -3,16 +3,10 @@
 // adds to each key operation besides the network and the key servers.
 #include <benchmark/benchmark.h>
 
-#include <fstream>
-
-#include "api/provider.h"
-#include "errors/error_builders.h"
 #include "platform/audit/audit.h"
-#include "platform/lumo/jsonrpc.h"
-#include "platform/util/log.h"
 #include "tests/api/token_signer.h"
+#include "tests/support/api_chain.h"
 #include "tests/support/fake_kms.h"
-#include "tests/support/temp_dir.h"
 
 namespace {
 
@@ -22,46 +16,33 @@ class NullAuditSink : public Tsl::Audit::AuditSink {
 };
 
 struct Chain {
-  Chain() {
+  Chain() : chain(Dependencies()) {
+    attestation = ZyrdTest::TokenBuilder::Valid(time(nullptr)).Exp(time(nullptr) + 3600).Sign();
+  }
+
+  static Zyrd::ZyrApi::ProviderDependencies Dependencies() {
     Groundwork::SetLogThreshold(2);
+    static NullAuditSink sink;
     Tsl::Audit::SetAuditSink(&sink);
     auto providers = std::make_shared<ZyrdTest::FakeProviders>();
     providers->Add(
         "p1", std::make_shared<ZyrdTest::FakeKms>(std::vector<ZyrdTest::FakeKms::Server>{{"s1"}}));
-    Zyrd::ZyrApi::ProviderDependencies deps = Zyrd::ZyrApi::DefaultDependencies();
+    Zyrd::ZyrApi::ProviderDependencies deps;
     deps.providers = providers;
     deps.readVouchdPublicKey = [](std::string& key) {
       key = ZyrdTest::VouchdKey().publicPem;
       return true;
     };
-    deps.metadataPath = ZYRD_SOURCE_DIR "/metadata/zyr_lumo_metadata.json";
-    deps.adminTokenPath = tmp / "admin.token";
-    auto logger = std::make_shared<Zyrd::ZyrApi::LumoLoggerWrapper>(&Log_Level);
-    handler = Lumo::Protocol::MakeJsonRpcHandler(
-        Zyrd::ZyrApi::CreateLocalProvider([](std::function<void()> t) { t(); }, logger, deps),
-        std::shared_ptr<const Lumo::L10n::Localizer>(&Zyrd::ZyrApi::CatalogueLocalizer(),
-                                                     [](auto*) {}),
-        logger);
-    std::ifstream in(tmp / "admin.token");
-    std::getline(in, admin);
-    attestation = ZyrdTest::TokenBuilder::Valid(time(nullptr)).Exp(time(nullptr) + 3600).Sign();
+    return deps;
   }
 
   void Run(benchmark::State& state, const std::string& token, const std::string& body) {
     size_t bytes = 0;
-    for (auto _ : state) {
-      auto call = std::make_shared<Lumo::Transport::HttpCall>();
-      call->body = body;
-      call->authorization = "Bearer " + token;
-      handler(call, [&](Lumo::Transport::HttpCallResult r) { bytes += r.body.size(); });
-    }
+    for (auto _ : state) bytes += chain.Send(body, token).body.size();
     benchmark::DoNotOptimize(bytes);
   }
 
-  ZyrdTest::TempDir tmp;
-  NullAuditSink sink;
-  Lumo::Transport::HttpCallHandler handler;
-  std::string admin;
+  ZyrdTest::ApiChain chain;
   std::string attestation;
 };
 
@@ -80,12 +61,12 @@ void BM_GenerateKeyWithAttestationToken(benchmark::State& state) {
 BENCHMARK(BM_GenerateKeyWithAttestationToken);
 
 void BM_GenerateKeyWithAdminToken(benchmark::State& state) {
-  TheChain().Run(state, TheChain().admin, kGenerate);
+  TheChain().Run(state, TheChain().chain.AdminToken(), kGenerate);
 }
 BENCHMARK(BM_GenerateKeyWithAdminToken);
 
 void BM_HostStatusWithAdminToken(benchmark::State& state) {
-  TheChain().Run(state, TheChain().admin,
+  TheChain().Run(state, TheChain().chain.AdminToken(),
                  R"({"jsonrpc":"2.0","id":1,"method":"com.tarsel.orna.kms.status.get"})");
 }
 BENCHMARK(BM_HostStatusWithAdminToken);

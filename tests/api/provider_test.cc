@@ -13,17 +13,17 @@
 #include "platform/lumo/jsonrpc.h"
 #include "platform/lumo/metadata.h"
 #include "tests/api/token_signer.h"
+#include "tests/support/api_chain.h"
 #include "tests/support/fake_kms.h"
 #include "tests/support/fakes.h"
 #include "tests/support/log_capture.h"
-#include "tests/support/temp_dir.h"
 
 namespace {
 
 namespace M = Lumo::Provider::Metadata;
 using boost::json::value;
 
-const std::string kMetadata = std::string(ZYRD_SOURCE_DIR) + "/metadata/zyr_lumo_metadata.json";
+const std::string& kMetadata = ZyrdTest::kMetadataFile;
 constexpr long kNow = 1'700'000'000;
 
 class AuditLines : public Tsl::Audit::AuditSink {
@@ -51,28 +51,16 @@ class ApiProviderTest : public ::testing::Test {
       key = ZyrdTest::VouchdKey().publicPem;
       return true;
     };
-    deps.metadataPath = kMetadata;
-    deps.adminTokenPath = tmp_ / "admin.token";
     deps.clock = &clock_;
     deps.stats = &stats_;
-    auto logger = std::make_shared<Zyrd::ZyrApi::LumoLoggerWrapper>(&Log_Level);
-    handler_ = Lumo::Protocol::MakeJsonRpcHandler(
-        Zyrd::ZyrApi::CreateLocalProvider([](std::function<void()> t) { t(); }, logger, deps),
-        std::shared_ptr<const Lumo::L10n::Localizer>(&Zyrd::ZyrApi::CatalogueLocalizer(),
-                                                     [](auto*) {}),
-        logger);
-    std::ifstream in(tmp_ / "admin.token");
-    std::getline(in, adminToken_);
+    chain_ = std::make_unique<ZyrdTest::ApiChain>(deps);
   }
   void TearDown() override { Tsl::Audit::SetAuditSink(nullptr); }
 
   // Posts one JSON-RPC call; returns the parsed response body.
   value Post(const std::string& method, const std::string& params, const std::string& token = "") {
-    auto call = std::make_shared<Lumo::Transport::HttpCall>();
-    call->body = R"({"jsonrpc":"2.0","id":1,"method":")" + method + R"(","params":)" + params + "}";
-    if (!token.empty()) call->authorization = "Bearer " + token;
-    Lumo::Transport::HttpCallResult result;
-    handler_(call, [&](Lumo::Transport::HttpCallResult r) { result = std::move(r); });
+    Lumo::Transport::HttpCallResult result = chain_->Send(
+        R"({"jsonrpc":"2.0","id":1,"method":")" + method + R"(","params":)" + params + "}", token);
     value body = boost::json::parse(result.body);
     lastErrorName_ = result.errorName;
     return body;
@@ -90,13 +78,11 @@ class ApiProviderTest : public ::testing::Test {
   std::string Attest() { return ZyrdTest::TokenBuilder::Valid(kNow).Sign(); }
 
   ZyrdTest::LogCapture log_{5};
-  ZyrdTest::TempDir tmp_;
   ZyrdTest::FakeClock clock_;
   Zyrd::Stats::KeyStats stats_{clock_};
   AuditLines audit_;
   std::shared_ptr<ZyrdTest::FakeProviders> providers_ = std::make_shared<ZyrdTest::FakeProviders>();
-  Lumo::Transport::HttpCallHandler handler_;
-  std::string adminToken_;
+  std::unique_ptr<ZyrdTest::ApiChain> chain_;
   std::string lastErrorName_;
 };
 
@@ -127,7 +113,7 @@ TEST_F(ApiProviderTest, ServiceErrorsReachTheCallerAndAreAuditedAsFailures) {
   EXPECT_EQ(body.at("result").at("error").at("messages").at(0).at("args").at("parameter"),
             "provider");
   EXPECT_EQ(lastErrorName_, "com.tarsel.lumo.std.errors.invalid_argument");
-  EXPECT_EQ(Outcome(kGenerate, R"({"provider":"p9","keySize":32})", adminToken_),
+  EXPECT_EQ(Outcome(kGenerate, R"({"provider":"p9","keySize":32})", chain_->AdminToken()),
             "com.tarsel.lumo.std.errors.not_found");
   EXPECT_EQ(Outcome("com.tarsel.orna.kms.key_operation.encrypt", R"({"plaintext":"x"})", Attest()),
             "com.tarsel.lumo.std.errors.error");
@@ -145,12 +131,13 @@ TEST_F(ApiProviderTest, AuthenticationAndAuthorisationOutcomes) {
   EXPECT_EQ(Outcome(kGenerate, R"({"provider":"p1","keySize":32})",
                     ZyrdTest::TokenBuilder::Valid(kNow).Exp(kNow - 1).Sign()),
             "com.tarsel.lumo.std.errors.unauthenticated");
-  EXPECT_EQ(Outcome(kGenerate, R"({"provider":"p1","keySize":32})", adminToken_), "ok");
+  EXPECT_EQ(Outcome(kGenerate, R"({"provider":"p1","keySize":32})", chain_->AdminToken()), "ok");
   EXPECT_EQ(Outcome("com.tarsel.orna.kms.status.get", "{}", Attest()), "ok");
   EXPECT_EQ(Outcome(list, "{}", Attest()), "com.tarsel.lumo.std.errors.unauthorized");
   // Described by the metadata, served by a later build.
-  EXPECT_EQ(Outcome(list, "{}", adminToken_), "com.tarsel.lumo.std.errors.operation_not_found");
-  EXPECT_EQ(Outcome("com.tarsel.orna.kms.nothing.here", "{}", adminToken_),
+  EXPECT_EQ(Outcome(list, "{}", chain_->AdminToken()),
+            "com.tarsel.lumo.std.errors.operation_not_found");
+  EXPECT_EQ(Outcome("com.tarsel.orna.kms.nothing.here", "{}", chain_->AdminToken()),
             "com.tarsel.lumo.std.errors.unauthorized");
   EXPECT_EQ(audit_.lines.back().at("object").as_string(), "com.tarsel.orna.kms.nothing:here");
 }
