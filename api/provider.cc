@@ -98,6 +98,7 @@ Lumo::Provider::ApiProviderPtr CreateLocalProvider(Lumo::Executor executor,
       "Loading authn metadata file: %s\n", path, "zyr_lumo_authentication",
       Metadata::ProviderHelper::LoadAuthnMetadataFile);
   auto authzInfo = LoadAuthzOrStop(path, logger);
+  VERIFY(deps.providers != nullptr && deps.clock != nullptr && deps.stats != nullptr);
 
   // The daemon's services, in binding order. Services without an
   // implementation in this build are described by the metadata but not bound;

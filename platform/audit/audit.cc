@@ -40,8 +40,10 @@ class FileSink final : public AuditSink {
 
  private:
   int Descriptor() {
+    int fd = fd_.load(std::memory_order_acquire);
+    if (fd >= 0) return fd;
     std::lock_guard<std::mutex> lock(mutex_);
-    if (fd_ >= 0) return fd_;
+    if (fd_.load() >= 0) return fd_.load();
     std::string path = Groundwork::RootPath(kAuditLogPath);
     std::string dir = path.substr(0, path.rfind('/'));
     // Create the missing directories; each one that exists is left as it is.
@@ -49,18 +51,19 @@ class FileSink final : public AuditSink {
       pos = dir.find('/', pos + 1);
       ::mkdir(dir.substr(0, pos).c_str(), 0700);
     }
-    fd_ = ::open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
-    if (fd_ < 0) {
+    fd = ::open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
+    if (fd < 0) {
       if (!failing_) Log_Level(2, "Cannot open audit log %s: %s\n", path.c_str(), strerror(errno));
       failing_ = true;
     } else {
       failing_ = false;
+      fd_.store(fd, std::memory_order_release);
     }
-    return fd_;
+    return fd;
   }
 
   std::mutex mutex_;
-  int fd_ = -1;
+  std::atomic<int> fd_{-1};
   bool failing_ = false;
 };
 
