@@ -14,8 +14,8 @@ def start_daemon():
     """Starts daemons under given roots; kills whatever is left at the end."""
     started = []
 
-    def start(root, env=None):
-        d = Daemon(root, env)
+    def start(root, env=None, metadata=True):
+        d = Daemon(root, env, metadata)
         started.append(d)
         return d
 

@@ -16,18 +16,6 @@
 
 namespace ZyrdTest {
 
-TempDir::TempDir() {
-  const char* base = std::getenv("TMPDIR");
-  std::string templ = std::string(base && *base ? base : "/tmp") + "/zyrd-test-XXXXXX";
-  if (mkdtemp(templ.data()) == nullptr) std::abort();
-  path_ = templ;
-}
-
-TempDir::~TempDir() {
-  std::error_code ec;
-  std::filesystem::remove_all(path_, ec);
-}
-
 namespace {
 
 std::vector<char*> Argv(const std::vector<std::string>& args) {

@@ -8,21 +8,9 @@
 #include <string>
 #include <vector>
 
+#include "tests/support/temp_dir.h"
+
 namespace ZyrdTest {
-
-// A directory under $TMPDIR (or /tmp) removed with everything in it when the
-// object goes away.
-class TempDir {
- public:
-  TempDir();
-  ~TempDir();
-  TempDir(const TempDir&) = delete;
-  TempDir& operator=(const TempDir&) = delete;
-  const std::filesystem::path& path() const { return path_; }
-
- private:
-  std::filesystem::path path_;
-};
 
 // Runs argv[0] (a full path) with the arguments, waits, and returns its exit
 // status (-1 when it could not run or died by a signal). Standard output is
