@@ -7,6 +7,8 @@
 #include <memory>
 #include <string>
 
+#include "config/config_transfer.h"
+#include "api/provider.h"
 #include "daemon/logger.h"
 #include "daemon/settings.h"
 #include "daemon/stats.h"
@@ -26,6 +28,17 @@ namespace {
 
 using Kestrel::Common::StrakeLumo::ErrorsTracker;
 using Kestrel::Common::StrakeLumo::TrafficTracker;
+
+// The provider lookup of a daemon without a providers state: it knows no
+// provider, so key operations answer not_found.
+class NoProviders final : public State::ProviderLookup {
+ public:
+  std::shared_ptr<Kms::Kms> GetProvider(const std::string&) override { return nullptr; }
+};
+
+// vouchd's key comes from the configuration store; without one, attestation
+// tokens cannot be checked and only the admin token authenticates.
+bool ReadVouchdPublicKey(std::string&) { return false; }
 
 void ReportRuntimeInitFailure(const std::exception& e) {
   std::string line = std::string("Initializing strake failed: ") + e.what() + "\n";
@@ -82,8 +95,18 @@ void RunDaemon() {
     ZyrApi::GetDaemonLogger();
     auto loggerWrapper = std::make_shared<ZyrApi::LumoLoggerWrapper>(&Log_Level);
 
+    Config::RestoreConfig();
+
     auto localizer = std::make_shared<const Lumo::L10n::Localizer>(
         std::vector<std::string>{"en_US"}, ZyrApi::ResolveMessage);
+
+    // Every task runs at once on the thread that hands it over.
+    Lumo::Executor executor = [](std::function<void()> task) { task(); };
+    ZyrApi::ProviderDependencies deps = ZyrApi::DefaultDependencies();
+    deps.providers = std::make_shared<NoProviders>();
+    deps.readVouchdPublicKey = ReadVouchdPublicKey;
+    Lumo::Provider::ApiProviderPtr apiProvider =
+        ZyrApi::CreateLocalProvider(executor, loggerWrapper, deps);
 
     Strake::Service::App* app = Strake::Service::GetApp();
     Stats::Global().Start(app->GetConfig(), app->GetScheduler());
@@ -97,6 +120,7 @@ void RunDaemon() {
     app->Run();
 
     trafficTracker->SetStopped(true);
+    apiProvider.reset();
     localizer.reset();
     loggerWrapper.reset();
     errorsTracker->Stop();

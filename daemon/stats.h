@@ -43,6 +43,10 @@ class KeyStats {
   // summary one interval from now on `scheduler`, which must outlive this.
   void Start(const Strake::Service::Config& config, Strake::System::Scheduler& scheduler);
 
+  // Now on this object's clock (monotonic microseconds): the start time an
+  // operation passes to Record.
+  uint64_t NowUs() const { return clock_.MonotonicUs(); }
+
   // Records one operation that began at `startUs` (monotonic microseconds).
   void Record(bool success, uint64_t startUs);
 

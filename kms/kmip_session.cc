@@ -18,7 +18,7 @@ constexpr const char* kCredentialOptions = ", Options={Authentication={User=%s, 
 
 void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert,
                             const char* warning) {
-  if (!Kestrel::Common::SslUtils::StandardizePemString(cert, kCertHeader, kCertFooterLf)) {
+  if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
     Log_Level(3, "%s", warning);
   }
   out.str().append(", Trusted_Cert=PEM:[").append(HexEncode(cert)).append("]");
@@ -94,7 +94,7 @@ Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
   out.append("Timeout=").append(std::to_string(timeout)).append(":Seconds, ");
   if (!info_->clientCertificate.empty()) {
     std::string cert = info_->clientCertificate;
-    if (!Kestrel::Common::SslUtils::StandardizePemString(cert, kCertHeader, kCertFooterLf)) {
+    if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
       Log_Level(3, "Could not standardize client certificate.\n");
     }
     std::string certHex = HexEncode(cert);
@@ -191,7 +191,7 @@ KmsResult KmipKms::FetchServerCertificate(uint32_t server, std::string& pem, std
               ServerName(server).c_str(), reason.c_str());
     return r;
   }
-  if (!Kestrel::Common::SslUtils::StandardizePemString(pem, kCertHeader, kCertFooter)) {
+  if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooter, pem)) {
     Log_Level(3, "Failed to standardize server certificate of key server %s\n",
               ServerName(server).c_str());
   }

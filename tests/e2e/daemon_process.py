@@ -10,6 +10,15 @@ import time
 BUILD_DIR = pathlib.Path(os.environ.get("ZYRD_BUILD_DIR", "build")).resolve()
 SOURCE_DIR = pathlib.Path(os.environ.get("ZYRD_SOURCE_DIR", ".")).resolve()
 CONFIG_REL = "etc/tarsel/cpservices/zyrd/config.xml"
+METADATA_REL = "usr/lib/tarsel/lumo/zyr_lumo_metadata.json"
+
+
+def install_metadata(root):
+    """Installs the API metadata file under root, as the package would."""
+    path = pathlib.Path(root) / METADATA_REL
+    path.parent.mkdir(parents=True, exist_ok=True)
+    path.write_bytes((SOURCE_DIR / "metadata" / "zyr_lumo_metadata.json").read_bytes())
+    return path
 
 
 def write_config(root, body):
@@ -22,7 +31,9 @@ def write_config(root, body):
 class Daemon:
     """A zyrd process whose standard error is collected line by line."""
 
-    def __init__(self, root, env=None):
+    def __init__(self, root, env=None, metadata=True):
+        if metadata:
+            install_metadata(root)
         full_env = dict(os.environ)
         full_env["ZYRD_ROOT"] = str(root)
         full_env.update(env or {})

@@ -51,3 +51,21 @@ def test_log_level_error_hides_information(tmp_path, start_daemon):
     assert d.stop() == 0
     lines = d.lines()
     assert not any("Stats logging interval" in l for l in lines)
+
+
+def test_missing_metadata_stops_start_up(tmp_path, start_daemon):
+    write_config(tmp_path, "")
+    d = start_daemon(tmp_path, metadata=False)
+    d.wait_for("Error loading file: ")
+    assert d.proc.wait(10) != 0
+    assert any("VERIFY api/provider:" in l for l in d.lines())
+
+
+def test_first_start_creates_private_admin_token(tmp_path, start_daemon):
+    write_config(tmp_path, "")
+    d = start_daemon(tmp_path)
+    d.wait_for("Stats logging interval")
+    token = tmp_path / "var/lib/zyrd/admin.token"
+    assert token.stat().st_mode & 0o777 == 0o600
+    assert len(token.read_text().strip()) == 43
+    assert d.stop() == 0

@@ -9,9 +9,9 @@ namespace {
 using Lumo::L10n::FormatTemplate;
 
 TEST(FormatTemplate, FillsNamedPlaceholders) {
-  EXPECT_EQ(FormatTemplate("Key server {server} is {state}.",
-                           {{"state", "down"}, {"server", "kmip-1"}}),
-            "Key server kmip-1 is down.");
+  EXPECT_EQ(
+      FormatTemplate("Key server {server} is {state}.", {{"state", "down"}, {"server", "kmip-1"}}),
+      "Key server kmip-1 is down.");
   EXPECT_EQ(FormatTemplate("{a}{a}{b}", {{"a", "x"}, {"b", "y"}}), "xxy");
 }
 

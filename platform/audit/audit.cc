@@ -1,0 +1,115 @@
+#include "platform/audit/audit.h"
+
+#include <errno.h>
+#include <fcntl.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <boost/json/object.hpp>
+#include <boost/json/serialize.hpp>
+#include <cstdio>
+#include <mutex>
+
+#include "platform/util/hostinfo.h"
+#include "platform/util/log.h"
+#include "platform/util/paths.h"
+
+namespace Tsl::Audit {
+namespace {
+
+constexpr const char* kAuditLogPath = "/var/log/zyrd/audit.log";
+
+// Appends to the audit log. The file is opened on first use and kept open;
+// a failed open is retried with the next record and logged once per run of
+// failures.
+class FileSink final : public AuditSink {
+ public:
+  bool Write(std::string_view line) override {
+    int fd = Descriptor();
+    if (fd < 0) return false;
+    ssize_t n = ::write(fd, line.data(), line.size());
+    if (n != static_cast<ssize_t>(line.size())) {
+      Log_Level(2, "Failed to write audit record: %s\n", n < 0 ? strerror(errno) : "short write");
+      return false;
+    }
+    return true;
+  }
+
+ private:
+  int Descriptor() {
+    int fd = fd_.load(std::memory_order_acquire);
+    if (fd >= 0) return fd;
+    std::lock_guard<std::mutex> lock(mutex_);
+    if (fd_.load() >= 0) return fd_.load();
+    std::string path = Groundwork::RootPath(kAuditLogPath);
+    std::string dir = path.substr(0, path.rfind('/'));
+    // Create the missing directories; each one that exists is left as it is.
+    for (size_t pos = 1; pos != std::string::npos;) {
+      pos = dir.find('/', pos + 1);
+      ::mkdir(dir.substr(0, pos).c_str(), 0700);
+    }
+    fd = ::open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
+    if (fd < 0) {
+      if (!failing_) Log_Level(2, "Cannot open audit log %s: %s\n", path.c_str(), strerror(errno));
+      failing_ = true;
+    } else {
+      failing_ = false;
+      fd_.store(fd, std::memory_order_release);
+    }
+    return fd;
+  }
+
+  std::mutex mutex_;
+  std::atomic<int> fd_{-1};
+  bool failing_ = false;
+};
+
+FileSink& DefaultSink() {
+  static FileSink* sink = new FileSink();  // kept for the life of the process
+  return *sink;
+}
+
+std::atomic<AuditSink*> gSink{nullptr};
+
+}  // namespace
+
+void SetAuditSink(AuditSink* sink) { gSink.store(sink); }
+
+std::string FormatRecord(int64_t timeUs, const char* eventId, const char* subject,
+                         const char* object, bool success, const TslAudit_Attr* attrs) {
+  time_t seconds = static_cast<time_t>(timeUs / 1000000);
+  struct tm tm;
+  gmtime_r(&seconds, &tm);
+  char time[64];
+  snprintf(time, sizeof(time), "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", tm.tm_year + 1900,
+           tm.tm_mon + 1, tm.tm_mday, tm.tm_hour, tm.tm_min, tm.tm_sec,
+           static_cast<int>((timeUs / 1000) % 1000));
+  boost::json::object record;
+  record["time"] = time;
+  record["eventId"] = eventId != nullptr ? eventId : "";
+  record["subject"] = subject != nullptr ? subject : "";
+  record["object"] = object != nullptr ? object : "";
+  record["success"] = success;
+  for (const TslAudit_Attr* a = attrs; a != nullptr && a->name != nullptr && a->name[0] != '\0';
+       ++a) {
+    // The fixed members keep their meaning whatever an attribute is called.
+    if (record.contains(a->name)) continue;
+    record[a->name] = a->value != nullptr ? a->value : "";
+  }
+  std::string line = boost::json::serialize(record);
+  line += '\n';
+  return line;
+}
+
+}  // namespace Tsl::Audit
+
+bool TslAudit_LogList(const char* eventId, const char* subject, const char* object, bool success,
+                      const TslAudit_Attr* attrs) {
+  std::string line =
+      Tsl::Audit::FormatRecord(Hostinfo_GetTimeOfDay(), eventId, subject, object, success, attrs);
+  Tsl::Audit::AuditSink* sink = Tsl::Audit::gSink.load();
+  return sink != nullptr ? sink->Write(line) : Tsl::Audit::DefaultSink().Write(line);
+}

@@ -1,0 +1,133 @@
+#include "config/trust_material.h"
+
+#include "tests/config/config_fixture.h"
+
+namespace {
+
+using namespace Zyrd::Config;
+using namespace ZyrdTest;
+
+class TrustMaterialTest : public ConfigTest {
+ protected:
+  void SetUp() override {
+    ConfigTest::SetUp();
+    CreateProvider("p1");
+  }
+};
+
+TEST_F(TrustMaterialTest, EveryOperationOnAMissingProviderGives3) {
+  std::string a = "a", b = "b";
+  std::vector<std::string> list;
+  EXPECT_EQ(GetCredential("nope", a), kStoreNotFound);
+  EXPECT_EQ(SetCredential("nope", "x"), kStoreNotFound);
+  EXPECT_EQ(GetClientCertificate("nope", a, b), kStoreNotFound);
+  EXPECT_EQ(SetClientCertificate("nope", "c", "k"), kStoreNotFound);
+  EXPECT_EQ(GetClientCsr("nope", a, b), kStoreNotFound);
+  EXPECT_EQ(SetClientCsr("nope", "c", "k"), kStoreNotFound);
+  EXPECT_EQ(GetServerCertificates("nope", list), kStoreNotFound);
+  EXPECT_EQ(SetServerCertificates("nope", {"c"}), kStoreNotFound);
+  EXPECT_EQ(a, "a");
+  EXPECT_EQ(b, "b");
+  EXPECT_TRUE(log_.Has(2, "Get credential could not find kmip server for provider nope: 3\n"));
+  EXPECT_TRUE(log_.Has(2, "Set credential could not find kmip server for provider nope: 3\n"));
+  EXPECT_EQ(log_.Count("Unable to find provider or kmip server config for nope: 3\n"), 2u);
+}
+
+TEST_F(TrustMaterialTest, CredentialIsKeptAsGivenAndAbsentLeavesTheOutput) {
+  std::string credential = "caller's";
+  ASSERT_EQ(GetCredential("p1", credential), kStoreOk);
+  EXPECT_EQ(credential, "caller's");
+  EXPECT_TRUE(log_.Has(6, "Getting credential for the provider p1\n"));
+
+  ASSERT_EQ(SetCredential("p1", " pass word\n"), kStoreOk);
+  EXPECT_TRUE(log_.Has(6, "Setting credential for the provider p1\n"));
+  ASSERT_EQ(GetCredential("p1", credential), kStoreOk);
+  EXPECT_EQ(credential, " pass word\n");
+  EXPECT_EQ(log_.Count("pass word"), 0u);  // never logged
+}
+
+TEST_F(TrustMaterialTest, ClientCertificateWithAndWithoutItsKey) {
+  std::string cert = "caller's", key = "caller's key";
+  ASSERT_EQ(GetClientCertificate("p1", cert, key), kStoreOk);
+  EXPECT_EQ(cert, "");
+  EXPECT_EQ(key, "caller's key");
+
+  ASSERT_EQ(SetClientCertificate("p1", "CERT", "KEY"), kStoreOk);
+  ASSERT_EQ(SetClientCertificate("p1", "CERT2", "KEY2"), kStoreOk);  // replaces
+  ASSERT_EQ(GetClientCertificate("p1", cert, key), kStoreOk);
+  EXPECT_EQ(cert, "CERT2");
+  EXPECT_EQ(key, "KEY2");
+
+  Tamper("p1", [](ProviderConfigObjects& o) {
+    o.kmipServer->GetSubObject(SubObjectId("client_certificate"))->DeleteValue("private_key");
+  });
+  EXPECT_EQ(GetClientCertificate("p1", cert, key), kStoreError);
+  EXPECT_TRUE(log_.Has(2, "Error reading private key from config store for provider p1\n"));
+}
+
+TEST_F(TrustMaterialTest, CsrIsSeparateFromTheClientCertificate) {
+  std::string csr = "caller's", key = "caller's key";
+  ASSERT_EQ(GetClientCsr("p1", csr, key), kStoreOk);
+  EXPECT_EQ(csr, "caller's");
+  EXPECT_EQ(key, "caller's key");
+  EXPECT_TRUE(log_.Has(6, "Client CSR for p1 provider not found\n"));
+
+  ASSERT_EQ(SetClientCsr("p1", "CSR", "CSRKEY"), kStoreOk);
+  ASSERT_EQ(GetClientCsr("p1", csr, key), kStoreOk);
+  EXPECT_EQ(csr, "CSR");
+  EXPECT_EQ(key, "CSRKEY");
+
+  std::string cert = "x", certKey = "y";
+  ASSERT_EQ(GetClientCertificate("p1", cert, certKey), kStoreOk);
+  EXPECT_EQ(cert, "");
+}
+
+TEST_F(TrustMaterialTest, ServerCertificatesNeverSetEmptyAndListed) {
+  std::vector<std::string> certs{"earlier"};
+  ASSERT_EQ(GetServerCertificates("p1", certs), kStoreOk);
+  EXPECT_EQ(certs, std::vector<std::string>{"earlier"});
+  EXPECT_EQ(log_.Count("certificates found in configstore"), 0u);
+
+  ASSERT_EQ(SetServerCertificates("p1", {"c3", "c1", "c2"}), kStoreOk);
+  ASSERT_EQ(GetServerCertificates("p1", certs), kStoreOk);
+  EXPECT_EQ(certs, (std::vector<std::string>{"earlier", "c3", "c1", "c2"}));
+  EXPECT_TRUE(log_.Has(6, "3 certificates found in configstore\n"));
+
+  ASSERT_EQ(SetServerCertificates("p1", {}), kStoreOk);
+  certs.clear();
+  ASSERT_EQ(GetServerCertificates("p1", certs), kStoreOk);
+  EXPECT_TRUE(certs.empty());
+  EXPECT_TRUE(log_.Has(6, "0 certificates found in configstore\n"));
+}
+
+TEST_F(TrustMaterialTest, FailedCommitsGive2AndChangeNothing) {
+  ASSERT_EQ(SetCredential("p1", "old"), kStoreOk);
+  const std::string before = ExportAll();
+  store_->FailOn(ThrowingStore::kUpdate);
+
+  EXPECT_EQ(SetCredential("p1", "new"), kStoreError);
+  ExpectInjected("Set credential failed to write to configstore: ");
+  EXPECT_EQ(SetClientCertificate("p1", "c", "k"), kStoreError);
+  ExpectInjected("Error writing client certificate to configstore: ");
+  EXPECT_EQ(SetClientCsr("p1", "c", "k"), kStoreError);
+  ExpectInjected("Caught ConfigStore exception during setting csr and key ");
+  EXPECT_EQ(SetServerCertificates("p1", {"c"}), kStoreError);
+  ExpectInjected("Error writing to configstore: ");
+  EXPECT_EQ(ExportAll(), before);
+}
+
+TEST_F(TrustMaterialTest, ReadsThatCatchNothingPassAStoreExceptionOn) {
+  Tamper("p1", [](ProviderConfigObjects& o) {
+    o.keyServer->SetValue("server_cert", std::string("one string, not a list"));
+    o.kmipServer->CreateSubObject(SubObjectId("client_certificate"))->SetValue("certificate", 5L);
+    o.kmipServer->SetValue("credential", 7L);
+  });
+  std::vector<std::string> certs;
+  std::string a, b;
+  EXPECT_THROW(GetServerCertificates("p1", certs), ConfigStoreException);
+  EXPECT_THROW(GetClientCertificate("p1", a, b), ConfigStoreException);
+  EXPECT_EQ(GetCredential("p1", a), kStoreError);  // this one catches
+  EXPECT_EQ(log_.Count("Exception reading credential from config store: "), 1u);
+}
+
+}  // namespace

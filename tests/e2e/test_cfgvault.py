@@ -1,0 +1,106 @@
+"""The store's command-line tool, and the daemon's restore of a seeded store."""
+
+import json
+import os
+import subprocess
+
+from daemon_process import BUILD_DIR, write_config
+
+CFGVAULT = str(BUILD_DIR / "cfgvault")
+
+PROVIDER = {
+    "key": "providers", "group": "kms", "component": "orna", "instance": "p1",
+    "values": {"master_key_id": "k1", "provider": "p1"},
+    "subObjects": [{
+        "name": "key_server", "instance": "",
+        "values": {"type": "KMIP", "connection_timeout": 30, "server_cert": ["c1", "c2"]},
+        "subObjects": [{
+            "name": "kmip_server", "instance": "", "values": {"username": "u"},
+            "subObjects": [
+                {"name": "servers", "instance": "s2", "values": {"hostname": "b", "port": 5696}},
+                {"name": "servers", "instance": "s1", "values": {"hostname": "a", "port": 5696}},
+            ],
+        }],
+    }],
+}
+
+
+def cfgvault(db, *args, stdin=None):
+    return subprocess.run([CFGVAULT, "--db", str(db), *args], input=stdin,
+                          capture_output=True, timeout=30)
+
+
+def seed(db, *objects):
+    text = json.dumps({"format": "orna-configstore-export", "version": 1,
+                       "objects": list(objects)})
+    result = cfgvault(db, "import", "-", stdin=text.encode())
+    assert result.returncode == 0, result.stderr
+
+
+def test_export_after_import_gives_the_text_back_byte_for_byte(tmp_path):
+    db = tmp_path / "store" / "configstore.db"
+    seed(db, PROVIDER)
+    first = cfgvault(db, "export", "providers", "kms", "orna")
+    assert first.returncode == 0, first.stderr
+    exported = tmp_path / "export.json"
+    exported.write_bytes(first.stdout)
+
+    other = tmp_path / "other.db"
+    assert cfgvault(other, "import", str(exported)).returncode == 0
+    second = cfgvault(other, "export", "providers", "kms", "orna")
+    assert second.stdout == first.stdout
+    assert json.loads(first.stdout)["objects"][0]["subObjects"][0]["subObjects"][0][
+        "subObjects"][0]["instance"] == "s2"  # server order kept
+
+    assert os.stat(db).st_mode & 0o777 == 0o600
+    assert os.stat(db.parent).st_mode & 0o777 == 0o700
+
+
+def test_malformed_import_exits_non_zero_and_changes_nothing(tmp_path):
+    db = tmp_path / "configstore.db"
+    seed(db, PROVIDER)
+    before = cfgvault(db, "export", "providers", "kms", "orna").stdout
+    for text in [b"", b"{", b'{"format":"orna-configstore-export","version":9,"objects":[]}',
+                 b'{"format":"orna-configstore-export","version":1,"objects":[{"key":"providers",'
+                 b'"group":"kms","component":"orna","instance":"p1","values":{"port":1.5}}]}']:
+        result = cfgvault(db, "import", "-", stdin=text)
+        assert result.returncode == 1
+        assert result.stderr.decode().startswith("cfgvault: import refused: ")
+        assert result.stderr.count(b"\n") == 1
+    missing = cfgvault(db, "import", str(tmp_path / "absent.json"))
+    assert missing.returncode == 1 and b"cannot read" in missing.stderr
+    assert cfgvault(db, "export", "providers", "kms", "orna").stdout == before
+
+
+def test_list_get_delete_and_usage(tmp_path):
+    db = tmp_path / "configstore.db"
+    seed(db, PROVIDER, dict(PROVIDER, instance="p0", values={"master_key_id": "k0"}))
+    assert cfgvault(db, "list", "providers", "kms", "orna").stdout == b"p0\np1\n"
+    got = cfgvault(db, "get", "providers", "kms", "orna", "p1")
+    assert json.loads(got.stdout)["values"]["master_key_id"] == "k1"
+    assert cfgvault(db, "delete", "providers", "kms", "orna", "p1").returncode == 0
+    result = cfgvault(db, "get", "providers", "kms", "orna", "p1")
+    assert (result.returncode, result.stderr) == (1, b"cfgvault: no object providers/kms/orna/p1\n")
+    for args in ([], ["export", "providers"], ["frobnicate"]):
+        result = cfgvault(db, *args)
+        assert result.returncode == 2 and result.stderr.startswith(b"cfgvault: usage: ")
+
+
+def test_default_database_is_the_daemons_and_start_up_restores_it(tmp_path, start_daemon):
+    env = dict(os.environ, ZYRD_ROOT=str(tmp_path))
+    text = json.dumps({"format": "orna-configstore-export", "version": 1,
+                       "objects": [PROVIDER]})
+    result = subprocess.run([CFGVAULT, "import", "-"], input=text.encode(), env=env,
+                            capture_output=True, timeout=30)
+    assert result.returncode == 0, result.stderr
+    assert (tmp_path / "var/lib/zyrd/configstore.db").exists()
+
+    write_config(tmp_path, "")
+    d = start_daemon(tmp_path)
+    d.wait_for("Restoring configuration key providers instance p1")
+    d.wait_for("Restoring configuration key zyrd_config")
+    assert d.stop() == 0
+    lines = d.lines()
+    restore = next(i for i, l in enumerate(lines) if "Restoring configuration key zyrd_config" in l)
+    stats = next(i for i, l in enumerate(lines) if "Stats logging interval" in l)
+    assert restore < stats

@@ -1,0 +1,44 @@
+// Feeds arbitrary bytes as the body of an HTTP call to the JSON-RPC handler
+// over the fully assembled API provider (with an admin token, so inputs reach
+// the services' decoders). Every body must get exactly one answer.
+#include <stdlib.h>
+
+#include <cstdint>
+
+#include "platform/audit/audit.h"
+#include "tests/support/api_chain.h"
+#include "tests/support/fake_kms.h"
+
+namespace {
+
+class NullAuditSink : public Tsl::Audit::AuditSink {
+ public:
+  bool Write(std::string_view) override { return true; }
+};
+
+Zyrd::ZyrApi::ProviderDependencies Dependencies() {
+  Groundwork::SetLogThreshold(Groundwork::kLogOff);
+  static NullAuditSink sink;
+  Tsl::Audit::SetAuditSink(&sink);
+  auto providers = std::make_shared<ZyrdTest::FakeProviders>();
+  providers->Add("p1", std::make_shared<ZyrdTest::FakeKms>(std::vector<ZyrdTest::FakeKms::Server>{
+                           {"s1", Zyrd::Kms::KeyServerTimeout}, {"s2"}}));
+  Zyrd::ZyrApi::ProviderDependencies deps;
+  deps.providers = providers;
+  deps.readVouchdPublicKey = [](std::string&) { return false; };
+  return deps;
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  static ZyrdTest::ApiChain chain(Dependencies());
+  auto call = std::make_shared<Lumo::Transport::HttpCall>();
+  call->body.assign(reinterpret_cast<const char*>(data), size);
+  call->authorization = "Bearer " + chain.AdminToken();
+  call->responseCode = size % 2 == 0 ? 1 : 2;
+  int answers = 0;
+  chain.Handler()(call, [&](Lumo::Transport::HttpCallResult) { ++answers; });
+  if (answers != 1) abort();
+  return 0;
+}
