@@ -2,6 +2,8 @@
 
 #include <array>
 
+#include "platform/util/secure_buffer.h"
+
 namespace {
 
 constexpr char kAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
@@ -71,3 +73,66 @@ bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out) {
   }
   return true;
 }
+
+namespace Groundwork {
+namespace {
+
+constexpr char kUrlAlphabet[] =
+    "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_";
+
+constexpr std::array<int8_t, 256> MakeUrlReverse() {
+  std::array<int8_t, 256> table{};
+  for (auto& v : table) v = -1;
+  for (int i = 0; i < 64; ++i) table[static_cast<uint8_t>(kUrlAlphabet[i])] = static_cast<int8_t>(i);
+  return table;
+}
+
+constexpr auto kUrlReverse = MakeUrlReverse();
+
+}  // namespace
+
+void Base64UrlEncode(const uint8_t* src, size_t length, std::string& out) {
+  out.reserve(out.size() + (length * 4 + 2) / 3);
+  size_t i = 0;
+  for (; i + 3 <= length; i += 3) {
+    uint32_t v = (uint32_t{src[i]} << 16) | (uint32_t{src[i + 1]} << 8) | src[i + 2];
+    out.push_back(kUrlAlphabet[(v >> 18) & 63]);
+    out.push_back(kUrlAlphabet[(v >> 12) & 63]);
+    out.push_back(kUrlAlphabet[(v >> 6) & 63]);
+    out.push_back(kUrlAlphabet[v & 63]);
+  }
+  size_t rest = length - i;
+  if (rest == 0) return;
+  uint32_t v = uint32_t{src[i]} << 16;
+  if (rest == 2) v |= uint32_t{src[i + 1]} << 8;
+  out.push_back(kUrlAlphabet[(v >> 18) & 63]);
+  out.push_back(kUrlAlphabet[(v >> 12) & 63]);
+  if (rest == 2) out.push_back(kUrlAlphabet[(v >> 6) & 63]);
+}
+
+template <typename Bytes>
+bool Base64UrlDecode(std::string_view text, Bytes& out) {
+  out.clear();
+  if (text.size() % 4 == 1) return false;
+  out.reserve(text.size() / 4 * 3 + 2);
+  uint32_t acc = 0;
+  int bits = 0;
+  for (char c : text) {
+    int8_t v = kUrlReverse[static_cast<uint8_t>(c)];
+    if (v < 0) return false;
+    acc = (acc << 6) | static_cast<uint32_t>(v);
+    bits += 6;
+    if (bits >= 8) {
+      bits -= 8;
+      out.push_back(static_cast<uint8_t>(acc >> bits));
+      acc &= (1u << bits) - 1;
+    }
+  }
+  // Unused low bits of the last character must be zero.
+  return acc == 0;
+}
+
+template bool Base64UrlDecode(std::string_view, std::vector<uint8_t>&);
+template bool Base64UrlDecode(std::string_view, SecureBytes&);
+
+}  // namespace Groundwork

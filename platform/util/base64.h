@@ -20,3 +20,18 @@ bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize,
 // Decodes standard Base64 text; false on any character outside the alphabet,
 // bad padding or a length that is not a multiple of four.
 bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out);
+
+namespace Groundwork {
+
+// URL-safe Base64 without padding ('-' and '_' for '+' and '/'), appended to
+// `out`.
+void Base64UrlEncode(const uint8_t* src, size_t length, std::string& out);
+
+// Strict inverse of Base64UrlEncode: false on any character outside the
+// URL-safe alphabet, padding, a length of 1 modulo 4, or non-zero unused bits
+// in the last character (so every byte string has exactly one encoding).
+// `out` is replaced.
+template <typename Bytes>
+bool Base64UrlDecode(std::string_view text, Bytes& out);
+
+}  // namespace Groundwork

@@ -39,6 +39,12 @@ struct ZeroingAllocator {
 
 using SecureBytes = std::vector<uint8_t, ZeroingAllocator<uint8_t>>;
 
+// Overwrites the bytes now (not only when the buffer is released) and empties it.
+inline void Wipe(SecureBytes& bytes) {
+  OPENSSL_cleanse(bytes.data(), bytes.size());
+  bytes.clear();
+}
+
 class SecureString {
  public:
   using Base = std::basic_string<char, std::char_traits<char>, ZeroingAllocator<char>>;
