@@ -2,11 +2,13 @@
 
 #include <unistd.h>
 
+#include <boost/asio/io_context.hpp>
 #include <cstdio>
 #include <exception>
 #include <memory>
 #include <string>
 
+#include "api/endpoint.h"
 #include "daemon/logger.h"
 #include "daemon/settings.h"
 #include "daemon/stats.h"
@@ -55,15 +57,27 @@ void InitRuntime() {
   }
 }
 
-}  // namespace
-
-bool InitSignals() {
-  return Kestrel::Common::SignalUtils::SignalsInit([] { ExitDaemon(0); });
+// The one place where the API is composed into the transport. Until the API
+// provider is assembled here, every call is answered with the JSON-RPC error
+// "method not found".
+Lumo::Transport::HttpCallHandler CreateApiHandler() {
+  return [](std::shared_ptr<Lumo::Transport::HttpCall>,
+            std::function<void(Lumo::Transport::HttpCallResult)> done) {
+    done({R"({"jsonrpc":"2.0","id":null,"error":{"code":-32601,"message":"Method not found"}})",
+          ""});
+  };
 }
 
-void ExitDaemon(int status) {
+}  // namespace
+
+bool InitSignals(ZyrApi::Endpoint* endpoint) {
+  return Kestrel::Common::SignalUtils::SignalsInit([endpoint] { ExitDaemon(0, endpoint); });
+}
+
+void ExitDaemon(int status, ZyrApi::Endpoint* endpoint) {
   Log_Level(3, "Exiting with status %d\n", status);
   Kestrel::Common::SignalUtils::SignalsExit();
+  if (endpoint != nullptr) endpoint->Stop();
   SSL_Exit();
   Strake::System::QuickExit(status);
 }
@@ -85,28 +99,51 @@ void RunDaemon() {
     auto localizer = std::make_shared<const Lumo::L10n::Localizer>(
         std::vector<std::string>{"en_US"}, ZyrApi::ResolveMessage);
 
+    Lumo::Transport::HttpCallHandler apiHandler = CreateApiHandler();
+
+    auto io = std::make_unique<boost::asio::io_context>();
+    auto endpoint = std::make_unique<ZyrApi::Endpoint>(ZyrApi::HttpPortFromEnvironment(), *io,
+                                                       apiHandler, loggerWrapper);
+
     Strake::Service::App* app = Strake::Service::GetApp();
     Stats::Global().Start(app->GetConfig(), app->GetScheduler());
 
-    if (!InitSignals()) {
-      Log_Level(2, "Failed to install signal handlers. Exiting.\n");
+    // Releases what start-up built, in reverse order of construction.
+    auto releaseApi = [&] {
+      endpoint.reset();
+      io.reset();
+      apiHandler = nullptr;
+      localizer.reset();
+      loggerWrapper.reset();
+    };
+
+    if (!endpoint->Start()) {
+      Log_Level(2, "HTTP endpoint failed to start. Exiting.\n");
+      releaseApi();
       errorsTracker->Stop();
       trafficTracker->SetStopped(true);
-      ExitDaemon(1);
+      ExitDaemon(1, nullptr);
     }
-    app->Run();
+
+    int status = 0;
+    if (InitSignals(endpoint.get())) {
+      app->Run();
+    } else {
+      Log_Level(2, "Failed to install signal handlers. Exiting.\n");
+      status = 1;
+    }
 
     trafficTracker->SetStopped(true);
-    localizer.reset();
-    loggerWrapper.reset();
+    endpoint->Stop();
+    releaseApi();
     errorsTracker->Stop();
     trafficTracker->SetStopped(true);
-    ExitDaemon(0);
+    ExitDaemon(status, nullptr);
   } catch (const std::exception& e) {
     Log_Level(2, "Exiting with error: %s\n", e.what());
     errorsTracker->Stop();
     trafficTracker->SetStopped(true);
-    ExitDaemon(1);
+    ExitDaemon(1, nullptr);
   }
 }
 
