@@ -71,7 +71,7 @@ class Session::Completion {
 
  private:
   void Deliver(HttpCallResult result) {
-    asio::post(session_->stream_.get_executor(),
+    asio::dispatch(session_->stream_.get_executor(),
                [session = session_, result = std::move(result)]() mutable {
                  session->WriteResult(std::move(result));
                });
