@@ -39,8 +39,7 @@ std::string FormatResponseHead(const ResponseHead& head) {
   out += "\r\n";
   if (!head.contentLength) {
     out += "Transfer-Encoding: chunked\r\n";
-  } else if (head.status != 204 && head.status / 100 != 1 &&
-             !(head.answersConnect && head.status / 100 == 2)) {
+  } else {
     out += "Content-Length: ";
     AppendNumber(out, *head.contentLength, 10);
     out += "\r\n";

@@ -113,6 +113,11 @@ void Session::Consume(size_t n) {
 
 void Session::Read(Step next, bool inBody) {
   const size_t room = std::min(kReadChunk, buffer_.max_size() - buffer_.size());
+  if (room == 0) {  // the parsers bound what they leave buffered; never read nothing
+    FailRequest("lumo.recv.failed", MakeErrorCode(HttpError::kProtocol));
+    Close();
+    return;
+  }
   stream_.expires_after(context_->config.readTimeout);
   stream_.async_read_some(buffer_.prepare(room),
                           [self = shared_from_this(), next, inBody](error_code ec, size_t n) {

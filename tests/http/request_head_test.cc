@@ -11,23 +11,17 @@ namespace {
 using namespace Lumo::Transport::PicoHttp;
 
 TEST(ContentTypes, CodesAndResponseChoice) {
-  EXPECT_EQ(ContentTypeCode("application/json; charset=utf-8"), kJson);
-  EXPECT_EQ(ContentTypeCode("Application/JSON"), kJson);
+  EXPECT_EQ(ContentTypeCode("Application/JSON; charset=utf-8"), kJson);
   EXPECT_EQ(ContentTypeCode("text/xml"), 0);
-  EXPECT_EQ(ContentTypeCode("application/vnd.tarsel.lumo.cframed.cleanjson"), kCframedCleanJson);
-  EXPECT_EQ(ContentTypeCode("application/vnd.tarsel.lumo.clean.stream.json, application/json"),
-            kCleanStreamJson | kJson);
-
+  // Neither stream type contains the other.
+  EXPECT_EQ(ContentTypeCode("application/vnd.tarsel.lumo.clean.stream.json"), kCleanStreamJson);
   EXPECT_EQ(ResponseCodeFor(std::nullopt), 1);
-  EXPECT_EQ(ResponseCodeFor("*/*"), 1);
-  EXPECT_EQ(ResponseCodeFor("application/vnd.tarsel.lumo.cleanjson, application/json"), 2);
   EXPECT_EQ(ResponseCodeFor("application/vnd.tarsel.lumo.cleanjson, "
                             "application/vnd.tarsel.lumo.stream.json"),
             16);
   EXPECT_EQ(ResponseCodeFor("application/vnd.tarsel.lumo.stream.json, "
                             "application/vnd.tarsel.lumo.clean.stream.json"),
             32);
-  EXPECT_EQ(ContentTypeForResponseCode(32), "application/vnd.tarsel.lumo.clean.stream.json");
 }
 
 RequestFacts ParseWhole(const std::string& head) {
@@ -98,40 +92,6 @@ TEST(RequestHeadParser, BodylessMethodsIgnoreDeclaredBodies) {
     EXPECT_TRUE(parser.Parser().is_done());
     EXPECT_EQ(input.substr(consumed), "NEXT");
   }
-}
-
-TEST(RequestHeadParser, UnusableHeads) {
-  auto error = [](const std::string& input) {
-    RequestHeadParser parser(1024, 2'500'000);
-    size_t consumed = 0;
-    EXPECT_EQ(parser.Parse(input, &consumed), RequestHeadParser::Status::kBad) << input;
-    return parser.Error().value();
-  };
-  EXPECT_EQ(error("garbage\r\n\r\n"), 5);
-  EXPECT_EQ(error(" / HTTP/1.1\r\n\r\n"), 5);
-  EXPECT_EQ(error("POST / HTTP/1.1\r\nContent-Length: ten\r\n\r\n"), 5);
-  EXPECT_EQ(error("POST / HTTP/1.1\r\nBad Header\r\n\r\n"), 1);
-  EXPECT_EQ(error("POST / HTTP/1.1\r\nX: " + std::string(2000, 'a') + "\r\n\r\n"), 7);
-  EXPECT_EQ(error(std::string(1024, 'a')), 7);
-  EXPECT_EQ(HttpErrorCategory().message(7), "http headers too long");
-  EXPECT_EQ(HttpErrorCategory().message(42), "transport error");
-}
-
-TEST(ResponseHead, LengthLineRules) {
-  ResponseHead head;
-  head.contentLength = 0;
-  head.contentType = "application/json";
-  head.status = 204;
-  head.reason = "No Content";
-  head.keepAlive = false;
-  EXPECT_EQ(FormatResponseHead(head),
-            "HTTP/1.1 204 No Content\r\nContent-Type: application/json\r\nConnection: close\r\n"
-            "Server: LUMO-PicoHttp\r\n\r\n");
-  head.status = 200;
-  head.answersConnect = true;
-  EXPECT_EQ(FormatResponseHead(head).find("Content-Length"), std::string::npos);
-  head.answersConnect = false;
-  EXPECT_NE(FormatResponseHead(head).find("\r\nContent-Length: 0\r\n"), std::string::npos);
 }
 
 TEST(ResponseHead, ChunkSizeLines) {

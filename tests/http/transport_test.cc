@@ -302,19 +302,6 @@ TEST_F(TransportTest, IdleConnectionIsClosedAfterReadTimeout) {
   EXPECT_TRUE(client.PeerClosed());
 }
 
-TEST_F(TransportTest, PeerLeavingMidBodyDoesNotDisturbOthers) {
-  {
-    RawHttpClient quitter(port_);
-    quitter.Send(
-        "POST /api HTTP/1.1\r\nContent-Type: application/json\r\nContent-Length: 100\r\n"
-        "\r\n{\"partial\"");
-  }
-  RawHttpClient client(port_);
-  client.Send(Post("{}"));
-  EXPECT_EQ(client.ReadResponse().body, "echo:{}");
-  EXPECT_EQ(Calls().size(), 1u);
-}
-
 // With every descriptor taken, accepting pauses and is retried; it resumes as
 // soon as a descriptor is free again.
 TEST_F(TransportTest, AcceptingResumesAfterDescriptorsRunOut) {

@@ -3,8 +3,7 @@
 // faulty server fails the test instead of hanging it.
 #pragma once
 
-#include <arpa/inet.h>
-#include <netinet/in.h>
+#include <netdb.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 #include <unistd.h>
@@ -26,34 +25,29 @@ class RawHttpClient {
  public:
   // Connects to `address` ("127.0.0.1" or "::1") on `port`, at once or, with
   // `connectNow` false, when Connect() is called (the socket exists before).
-  RawHttpClient(const std::string& address, uint16_t port, bool connectNow = true)
-      : address_(address), port_(port) {
-    v6_ = address.find(':') != std::string::npos;
-    fd_ = ::socket(v6_ ? AF_INET6 : AF_INET, SOCK_STREAM, 0);
+  RawHttpClient(const std::string& address, uint16_t port, bool connectNow = true) {
+    addrinfo hints{};
+    hints.ai_flags = AI_NUMERICHOST | AI_NUMERICSERV;
+    hints.ai_socktype = SOCK_STREAM;
+    if (::getaddrinfo(address.c_str(), std::to_string(port).c_str(), &hints, &address_) != 0) {
+      throw std::runtime_error("bad address " + address);
+    }
+    fd_ = ::socket(address_->ai_family, SOCK_STREAM, 0);
     if (fd_ < 0) throw std::runtime_error("socket failed");
     timeval timeout{10, 0};
     ::setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof(timeout));
     if (connectNow) Connect();
   }
   void Connect() {
-    int rc;
-    if (v6_) {
-      sockaddr_in6 sa{};
-      sa.sin6_family = AF_INET6;
-      sa.sin6_port = htons(port_);
-      ::inet_pton(AF_INET6, address_.c_str(), &sa.sin6_addr);
-      rc = ::connect(fd_, reinterpret_cast<sockaddr*>(&sa), sizeof(sa));
-    } else {
-      sockaddr_in sa{};
-      sa.sin_family = AF_INET;
-      sa.sin_port = htons(port_);
-      ::inet_pton(AF_INET, address_.c_str(), &sa.sin_addr);
-      rc = ::connect(fd_, reinterpret_cast<sockaddr*>(&sa), sizeof(sa));
+    if (::connect(fd_, address_->ai_addr, address_->ai_addrlen) != 0) {
+      throw std::runtime_error("connect failed: " + std::to_string(errno));
     }
-    if (rc != 0) throw std::runtime_error("connect failed: " + std::to_string(errno));
   }
   explicit RawHttpClient(uint16_t port) : RawHttpClient("127.0.0.1", port) {}
-  ~RawHttpClient() { ::close(fd_); }
+  ~RawHttpClient() {
+    ::close(fd_);
+    ::freeaddrinfo(address_);
+  }
   RawHttpClient(const RawHttpClient&) = delete;
   RawHttpClient& operator=(const RawHttpClient&) = delete;
 
@@ -128,9 +122,7 @@ class RawHttpClient {
     return out;
   }
 
-  std::string address_;
-  uint16_t port_;
-  bool v6_ = false;
+  addrinfo* address_ = nullptr;
   int fd_ = -1;
   bool eof_ = false;
   std::string buffered_;
