@@ -72,9 +72,9 @@ class Session::Completion {
  private:
   void Deliver(HttpCallResult result) {
     asio::dispatch(session_->stream_.get_executor(),
-               [session = session_, result = std::move(result)]() mutable {
-                 session->WriteResult(std::move(result));
-               });
+                   [session = session_, result = std::move(result)]() mutable {
+                     session->WriteResult(std::move(result));
+                   });
   }
 
   std::shared_ptr<Session> session_;
@@ -191,16 +191,7 @@ void Session::OnHead() {
   }
 
   if (facts.expectContinue && !head_->Parser().is_done()) {
-    stream_.expires_after(context_->config.writeTimeout);
-    asio::async_write(stream_, asio::buffer(kContinue.data(), kContinue.size()),
-                      [self = shared_from_this()](error_code ec, size_t) {
-                        if (ec) {
-                          self->FailRequest("lumo.send.failed", ec);
-                          self->Close();
-                          return;
-                        }
-                        self->ReadBody();
-                      });
+    Write(asio::buffer(kContinue.data(), kContinue.size()), &Session::ReadBody);
     return;
   }
   ReadBody();
@@ -364,16 +355,19 @@ void Session::Refuse(std::string_view name, std::string_view messageId) {
 void Session::WriteAndLinger(std::string text) {
   head_.reset();
   fixedResponse_ = std::move(text);
+  Write(asio::buffer(fixedResponse_), &Session::LingeringClose);
+}
+
+void Session::Write(asio::const_buffer data, Step next) {
   stream_.expires_after(context_->config.writeTimeout);
-  asio::async_write(stream_, asio::buffer(fixedResponse_),
-                    [self = shared_from_this()](error_code ec, size_t) {
-                      if (ec) {
-                        self->FailRequest("lumo.send.failed", ec);
-                        self->Close();
-                        return;
-                      }
-                      self->LingeringClose();
-                    });
+  asio::async_write(stream_, data, [self = shared_from_this(), next](error_code ec, size_t) {
+    if (ec) {
+      self->FailRequest("lumo.send.failed", ec);
+      self->Close();
+      return;
+    }
+    ((*self).*next)();
+  });
 }
 
 // Closing a socket with unread input resets the connection, and the peer may

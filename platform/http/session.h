@@ -55,6 +55,9 @@ class Session : public std::enable_shared_from_this<Session> {
   void OnResponseWritten();
 
   void Read(Step next, bool inBody);
+  // Writes `data` (which must stay valid), then goes on with `next`; a failed
+  // write closes the connection.
+  void Write(boost::asio::const_buffer data, Step next);
   void Refuse(std::string_view name, std::string_view messageId);
   // Writes fixed bytes, then closes the connection while draining the peer.
   void WriteAndLinger(std::string text);
