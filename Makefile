@@ -3,7 +3,7 @@ BUILD_DIR ?= build
 RUN_ROOT ?= $(CURDIR)/.run
 CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DZYRD_WERROR=ON
 
-.PHONY: all deps build test run clean
+.PHONY: all deps build test run bench clean
 
 all: build
 
@@ -22,6 +22,9 @@ test: build
 
 run: build
 	scripts/run-local $(BUILD_DIR) $(RUN_ROOT)
+
+bench: build
+	bench/run-http-bench $(BUILD_DIR)
 
 clean:
 	rm -rf $(BUILD_DIR) build-fuzz $(RUN_ROOT)

@@ -2,17 +2,21 @@
 
 #include <unistd.h>
 
+#include <boost/asio/io_context.hpp>
 #include <cstdio>
 #include <exception>
 #include <memory>
 #include <string>
 
-#include "config/config_transfer.h"
+#include "api/endpoint.h"
 #include "api/provider.h"
+#include "config/config_transfer.h"
+#include "config/provider_config.h"
 #include "daemon/logger.h"
 #include "daemon/settings.h"
 #include "daemon/stats.h"
 #include "errors/message_catalogue.h"
+#include "platform/lumo/jsonrpc.h"
 #include "platform/lumo/localizer.h"
 #include "platform/runtime/app.h"
 #include "platform/runtime/system.h"
@@ -22,23 +26,13 @@
 #include "platform/util/log.h"
 #include "platform/util/paths.h"
 #include "platform/util/ssl_init.h"
+#include "state/global_providers.h"
 
 namespace Zyrd {
 namespace {
 
 using Kestrel::Common::StrakeLumo::ErrorsTracker;
 using Kestrel::Common::StrakeLumo::TrafficTracker;
-
-// The provider lookup of a daemon without a providers state: it knows no
-// provider, so key operations answer not_found.
-class NoProviders final : public State::ProviderLookup {
- public:
-  std::shared_ptr<Kms::Kms> GetProvider(const std::string&) override { return nullptr; }
-};
-
-// vouchd's key comes from the configuration store; without one, attestation
-// tokens cannot be checked and only the admin token authenticates.
-bool ReadVouchdPublicKey(std::string&) { return false; }
 
 void ReportRuntimeInitFailure(const std::exception& e) {
   std::string line = std::string("Initializing strake failed: ") + e.what() + "\n";
@@ -70,13 +64,14 @@ void InitRuntime() {
 
 }  // namespace
 
-bool InitSignals() {
-  return Kestrel::Common::SignalUtils::SignalsInit([] { ExitDaemon(0); });
+bool InitSignals(ZyrApi::Endpoint* endpoint) {
+  return Kestrel::Common::SignalUtils::SignalsInit([endpoint] { ExitDaemon(0, endpoint); });
 }
 
-void ExitDaemon(int status) {
+void ExitDaemon(int status, ZyrApi::Endpoint* endpoint) {
   Log_Level(3, "Exiting with status %d\n", status);
   Kestrel::Common::SignalUtils::SignalsExit();
+  if (endpoint != nullptr) endpoint->Stop();
   SSL_Exit();
   Strake::System::QuickExit(status);
 }
@@ -102,35 +97,60 @@ void RunDaemon() {
 
     // Every task runs at once on the thread that hands it over.
     Lumo::Executor executor = [](std::function<void()> task) { task(); };
+    State::Providers& providers = State::GlobalProviders();
     ZyrApi::ProviderDependencies deps = ZyrApi::DefaultDependencies();
-    deps.providers = std::make_shared<NoProviders>();
-    deps.readVouchdPublicKey = ReadVouchdPublicKey;
+    // The providers state is process-wide and outlives every request.
+    deps.providers =
+        std::shared_ptr<State::ProviderLookup>(&providers, [](State::ProviderLookup*) {});
+    deps.readVouchdPublicKey = [](std::string& key) { return Config::ReadVouchdPublicKey(key); };
     Lumo::Provider::ApiProviderPtr apiProvider =
         ZyrApi::CreateLocalProvider(executor, loggerWrapper, deps);
 
+    auto io = std::make_unique<boost::asio::io_context>();
+    auto endpoint = std::make_unique<ZyrApi::Endpoint>(
+        ZyrApi::HttpPortFromEnvironment(), *io,
+        Lumo::Protocol::MakeJsonRpcHandler(apiProvider, localizer, loggerWrapper), loggerWrapper);
+
     Strake::Service::App* app = Strake::Service::GetApp();
+    providers.Configure(app->GetConfig(), app->GetScheduler());
     Stats::Global().Start(app->GetConfig(), app->GetScheduler());
 
-    if (!InitSignals()) {
-      Log_Level(2, "Failed to install signal handlers. Exiting.\n");
+    // Releases what start-up built, in reverse order of construction.
+    auto releaseApi = [&] {
+      endpoint.reset();
+      io.reset();
+      apiProvider.reset();
+      localizer.reset();
+      loggerWrapper.reset();
+    };
+
+    if (!endpoint->Start()) {
+      Log_Level(2, "HTTP endpoint failed to start. Exiting.\n");
+      releaseApi();
       errorsTracker->Stop();
       trafficTracker->SetStopped(true);
-      ExitDaemon(1);
+      ExitDaemon(1, nullptr);
     }
-    app->Run();
+
+    int status = 0;
+    if (InitSignals(endpoint.get())) {
+      app->Run();
+    } else {
+      Log_Level(2, "Failed to install signal handlers. Exiting.\n");
+      status = 1;
+    }
 
     trafficTracker->SetStopped(true);
-    apiProvider.reset();
-    localizer.reset();
-    loggerWrapper.reset();
+    endpoint->Stop();
+    releaseApi();
     errorsTracker->Stop();
     trafficTracker->SetStopped(true);
-    ExitDaemon(0);
+    ExitDaemon(status, nullptr);
   } catch (const std::exception& e) {
     Log_Level(2, "Exiting with error: %s\n", e.what());
     errorsTracker->Stop();
     trafficTracker->SetStopped(true);
-    ExitDaemon(1);
+    ExitDaemon(1, nullptr);
   }
 }
 

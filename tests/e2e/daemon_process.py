@@ -36,6 +36,8 @@ class Daemon:
             install_metadata(root)
         full_env = dict(os.environ)
         full_env["ZYRD_ROOT"] = str(root)
+        # A free port unless a test names one: daemons of parallel runs never meet.
+        full_env["ZYRD_HTTP_PORT"] = "0"
         full_env.update(env or {})
         self.proc = subprocess.Popen(
             [str(BUILD_DIR / "zyrd")],
@@ -74,6 +76,11 @@ class Daemon:
                     raise AssertionError(
                         "no line with %r; got:\n%s" % (fragment, "\n".join(self._lines)))
                 self._cond.wait(min(left, 0.1))
+
+    def http_port(self, timeout=10.0):
+        """The port the endpoint serves, from its start-up line."""
+        line = self.wait_for("HTTP endpoint listening on TCP port ", timeout)
+        return int(line.rsplit(" ", 1)[1])
 
     def handles_sigterm(self):
         """Whether the process has installed its SIGTERM handler yet."""
