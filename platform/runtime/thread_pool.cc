@@ -21,7 +21,9 @@ void ThreadPool::Enqueue(std::function<void()> task) {
   std::lock_guard<std::mutex> lock(mutex_);
   if (stopping_) return;
   queue_.push_back(std::move(task));
-  if (idle_ == 0 && threads_.size() < maxThreads_) {
+  // Every queued task needs a thread of its own: idle threads that have not
+  // woken yet are already spoken for by the tasks queued before this one.
+  if (queue_.size() > idle_ && threads_.size() < maxThreads_) {
     size_t index = threads_.size();
     threads_.emplace_back([this, index] { Worker(index); });
   } else {
