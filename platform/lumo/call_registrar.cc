@@ -24,8 +24,10 @@ void CallRegistrar::Invoke(Core::CallPtr call, Core::Completion completion) {
     AuditAttributes& attrs = call->activation.auditAttributes;
     if (call->activation.authData != nullptr) attrs[kSubject] = call->activation.authData->username;
     attrs[kResult] = result.IsOutput() ? "true" : "false";
-    completion.Complete(std::move(result));
+    // The record is written before the answer leaves, so a caller that has
+    // its answer can rely on the call being on record.
     writer(attrs);
+    completion.Complete(std::move(result));
   });
   next_->Invoke(std::move(call), std::move(observed));
 }
