@@ -55,8 +55,10 @@ struct ProviderConfigObjects {
 
 // The "providers" object of `name`: 3 when absent ("Provider %s not found").
 int FindProviderObject(const std::string& name, ConfigStoreObjectPtr& provider);
-// The sub-object `name` (empty instance) of `parent`: 3 when absent.
-int GetSubObject(const StoreObjectPtr& parent, const std::string& name, StoreObjectPtr& child);
+// The sub-object `name` (empty instance) of `parent`: 3 when absent, logged
+// at `notFoundLevel` (an error, unless the caller treats absence as normal).
+int GetSubObject(const StoreObjectPtr& parent, const std::string& name, StoreObjectPtr& child,
+                 int notFoundLevel = 2);
 // The provider and its "key_server".
 int GetKeyServerObject(const std::string& name, ConfigStoreObjectPtr& provider,
                        StoreObjectPtr& keyServer);

@@ -24,7 +24,8 @@ int FindProviderObject(const std::string& name, ConfigStoreObjectPtr& provider) 
   return kStoreOk;
 }
 
-int GetSubObject(const StoreObjectPtr& parent, const std::string& name, StoreObjectPtr& child) {
+int GetSubObject(const StoreObjectPtr& parent, const std::string& name, StoreObjectPtr& child,
+                 int notFoundLevel) {
   try {
     child = parent->GetSubObject(SubObjectId(name));
   } catch (const ConfigStoreException& e) {
@@ -32,7 +33,7 @@ int GetSubObject(const StoreObjectPtr& parent, const std::string& name, StoreObj
     return kStoreError;
   }
   if (!child) {
-    Log_Level(2, "Config store object %s not found\n", name.c_str());
+    Log_Level(notFoundLevel, "Config store object %s not found\n", name.c_str());
     return kStoreNotFound;
   }
   return kStoreOk;
@@ -55,7 +56,8 @@ int GetProviderObjects(const std::string& name, ProviderConfigObjects& objects) 
   objects.name = name;
   int rc = GetKeyServerObject(name, objects.provider, objects.keyServer);
   if (rc != kStoreOk) return rc;
-  rc = GetSubObject(objects.keyServer, kProxyServer, objects.proxyServer);
+  // Most providers have no proxy: its absence is verbose detail, not an error.
+  rc = GetSubObject(objects.keyServer, kProxyServer, objects.proxyServer, 6);
   if (rc == kStoreNotFound) {
     objects.proxyServer.reset();
   } else if (rc != kStoreOk) {

@@ -45,7 +45,7 @@ TEST_F(ProviderConfigTest, UnsetTimeoutEmptyUsernameAndMissingPartsReadBackAsAbs
   EXPECT_FALSE(info->keyServer.proxyServer || info->keyServer.connectionTimeout ||
                info->keyServer.kmipServer.username);
   EXPECT_TRUE(info->keyServer.kmipServer.servers.empty());
-  EXPECT_TRUE(log_.Has(2, "Config store object proxy_server not found\n"));
+  EXPECT_TRUE(log_.Has(6, "Config store object proxy_server not found\n"));
 
   Zyrd::Kms::KmsInfo client;
   ASSERT_EQ(ReadClientConfig("bare", client), kStoreOk);
