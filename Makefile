@@ -25,6 +25,7 @@ run: build
 
 bench: build
 	bench/run-http-bench $(BUILD_DIR)
+	bench/run-key-bench $(BUILD_DIR)
 
 clean:
 	rm -rf $(BUILD_DIR) build-fuzz $(RUN_ROOT)

@@ -1,9 +1,10 @@
 #include "platform/http/request_head.h"
 
 #include <algorithm>
-#include <boost/algorithm/string/predicate.hpp>
 #include <boost/asio/buffer.hpp>
 #include <boost/beast/http/error.hpp>
+
+#include "platform/util/ascii.h"
 
 namespace Lumo::Transport::PicoHttp {
 namespace {
@@ -36,12 +37,12 @@ class HttpErrorCategoryImpl : public boost::system::error_category {
 
 std::string Lower(std::string_view text) {
   std::string out(text);
-  for (char& c : out) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+  for (char& c : out) c = Groundwork::AsciiLower(c);
   return out;
 }
 
 bool Contains(std::string_view haystack, std::string_view needle) {
-  return boost::algorithm::icontains(haystack, needle);
+  return Groundwork::AsciiIContains(haystack, needle);
 }
 
 }  // namespace
@@ -131,7 +132,7 @@ RequestFacts GatherFacts(std::string_view lowerMethod, const std::vector<Header>
       facts.keepAlive = !Contains(h.value, "close");
     } else if (h.name == "expect") {
       facts.expect = true;
-      facts.expectContinue = boost::algorithm::iequals(h.value, "100-continue");
+      facts.expectContinue = Groundwork::AsciiIEquals(h.value, "100-continue");
     }
   }
   if (facts.chunked) facts.contentLength.reset();

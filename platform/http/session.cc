@@ -1,10 +1,10 @@
 #include "platform/http/session.h"
 
+
 #include <openssl/crypto.h>
 
 #include <array>
 #include <atomic>
-#include <boost/algorithm/string/predicate.hpp>
 #include <boost/asio/dispatch.hpp>
 #include <boost/asio/post.hpp>
 #include <boost/asio/write.hpp>
@@ -12,6 +12,7 @@
 
 #include "platform/http/response.h"
 #include "platform/lumo/log.h"
+#include "platform/util/ascii.h"
 
 namespace Lumo::Transport::PicoHttp {
 namespace {
@@ -237,11 +238,11 @@ void Session::Dispatch() {
   for (auto& field : message) {
     std::string_view name(field.name_string());
     std::string_view value(field.value());
-    if (call->authorization.empty() && boost::algorithm::iequals(name, "authorization")) {
+    if (call->authorization.empty() && Groundwork::AsciiIEquals(name, "authorization")) {
       call->authorization.assign(value);
       // The parsed head belongs to this session: overwrite its copy of the token.
       OPENSSL_cleanse(const_cast<char*>(value.data()), value.size());
-    } else if (call->acceptLanguage.empty() && boost::algorithm::iequals(name, "accept-language")) {
+    } else if (call->acceptLanguage.empty() && Groundwork::AsciiIEquals(name, "accept-language")) {
       call->acceptLanguage.assign(value);
     }
   }

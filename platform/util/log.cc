@@ -2,6 +2,7 @@
 
 #include <sys/syscall.h>
 #include <sys/time.h>
+#include <pthread.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -16,6 +17,23 @@ namespace {
 std::atomic<int> gThreshold{5};
 std::atomic<LogSink*> gSink{nullptr};
 thread_local std::string tThreadName;
+
+// The process id, read once (a system call per line adds up); a forked child
+// reads its own.
+std::atomic<pid_t> gPid{0};
+
+pid_t CachedPid() {
+  pid_t pid = gPid.load(std::memory_order_relaxed);
+  if (pid == 0) {
+    static const bool registered = [] {
+      return pthread_atfork(nullptr, nullptr, [] { gPid.store(0); }) == 0;
+    }();
+    (void)registered;
+    pid = getpid();
+    gPid.store(pid, std::memory_order_relaxed);
+  }
+  return pid;
+}
 
 const char* LevelName(int level) {
   static const char* const kNames[] = {"op",     "crit", "error",   "warning",
@@ -83,7 +101,7 @@ std::string FormatLogLine(int level, std::string_view text) {
 
   std::string line;
   line.reserve(text.size() + 64);
-  line.append(stamp).append(" zyrd[").append(std::to_string(getpid())).append("] ");
+  line.append(stamp).append(" zyrd[").append(std::to_string(CachedPid())).append("] ");
   line.append(LevelName(level)).append(" [").append(thread).append("] ");
   line.append(text);
   if (line.back() != '\n') line.push_back('\n');
