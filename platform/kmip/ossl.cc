@@ -4,22 +4,9 @@
 
 namespace Qlc {
 
-std::string TakeOpensslErrors() {
-  std::string text;
-  char buf[256];
-  while (unsigned long e = ERR_get_error()) {
-    ERR_error_string_n(e, buf, sizeof buf);
-    if (!text.empty()) text += "; ";
-    text += buf;
-  }
-  return text;
-}
-
 namespace {
 
-BioPtr ReadOnlyBio(std::string_view text) {
-  return BioPtr(BIO_new_mem_buf(text.data(), static_cast<int>(text.size())));
-}
+using Kestrel::Common::Ssl::ReadOnlyBio;
 
 int NoPassphrase(char*, int, int, void*) { return 0; }
 

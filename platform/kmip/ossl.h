@@ -2,34 +2,25 @@
 // conversion of OpenSSL's error queue into a reason text.
 #pragma once
 
-#include <openssl/bio.h>
-#include <openssl/err.h>
-#include <openssl/evp.h>
-#include <openssl/ssl.h>
-#include <openssl/x509.h>
-
 #include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "platform/ssl/openssl_ptr.h"
+
 namespace Qlc {
 
-template <typename T, void (*Free)(T*)>
-struct OsslDeleter {
-  void operator()(T* p) const { Free(p); }
-};
-
-using BioPtr = std::unique_ptr<BIO, OsslDeleter<BIO, BIO_free_all>>;
-using X509Ptr = std::unique_ptr<X509, OsslDeleter<X509, X509_free>>;
-using PkeyPtr = std::unique_ptr<EVP_PKEY, OsslDeleter<EVP_PKEY, EVP_PKEY_free>>;
-using SslCtxPtr = std::unique_ptr<SSL_CTX, OsslDeleter<SSL_CTX, SSL_CTX_free>>;
-using SslPtr = std::unique_ptr<SSL, OsslDeleter<SSL, SSL_free>>;
-using X509StorePtr = std::unique_ptr<X509_STORE, OsslDeleter<X509_STORE, X509_STORE_free>>;
+using Kestrel::Common::Ssl::BioPtr;
+using Kestrel::Common::Ssl::SslCtxPtr;
+using Kestrel::Common::Ssl::SslPtr;
+using Kestrel::Common::Ssl::X509Ptr;
+using Kestrel::Common::Ssl::X509StorePtr;
+using PkeyPtr = Kestrel::Common::Ssl::EvpPkeyPtr;
 
 // Empties the calling thread's OpenSSL error queue and returns its entries
 // as one text ("" when empty), most recent last.
-std::string TakeOpensslErrors();
+inline std::string TakeOpensslErrors() { return Kestrel::Common::Ssl::TakeErrorText(""); }
 
 // Reads every certificate of a PEM text (one or a bundle). Empty when the text
 // holds none or any of them is damaged.

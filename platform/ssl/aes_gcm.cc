@@ -6,13 +6,12 @@
 #include <climits>
 #include <memory>
 
+#include "platform/ssl/openssl_ptr.h"
+
 namespace Kestrel::Common::SslUtils {
 namespace {
 
-struct CipherCtxFree {
-  void operator()(EVP_CIPHER_CTX* ctx) const { EVP_CIPHER_CTX_free(ctx); }
-};
-using CipherCtx = std::unique_ptr<EVP_CIPHER_CTX, CipherCtxFree>;
+using CipherCtx = Ssl::EvpCipherCtxPtr;
 
 const EVP_CIPHER* CipherFor(size_t keyLength) {
   switch (keyLength) {

@@ -10,6 +10,7 @@
 #include <openssl/bn.h>
 #include <openssl/err.h>
 #include <openssl/evp.h>
+#include <openssl/ssl.h>
 #include <openssl/x509.h>
 #include <openssl/x509_vfy.h>
 
@@ -34,6 +35,8 @@ using EvpMdCtxPtr = std::unique_ptr<EVP_MD_CTX, Deleter<EVP_MD_CTX_free>>;
 using EvpMdPtr = std::unique_ptr<EVP_MD, Deleter<EVP_MD_free>>;
 using EvpPkeyCtxPtr = std::unique_ptr<EVP_PKEY_CTX, Deleter<EVP_PKEY_CTX_free>>;
 using EvpPkeyPtr = std::unique_ptr<EVP_PKEY, Deleter<EVP_PKEY_free>>;
+using SslCtxPtr = std::unique_ptr<SSL_CTX, Deleter<SSL_CTX_free>>;
+using SslPtr = std::unique_ptr<SSL, Deleter<SSL_free>>;
 using X509NamePtr = std::unique_ptr<X509_NAME, Deleter<X509_NAME_free>>;
 using X509Ptr = std::unique_ptr<X509, Deleter<X509_free>>;
 using X509ReqPtr = std::unique_ptr<X509_REQ, Deleter<X509_REQ_free>>;
