@@ -14,7 +14,7 @@
 
 local_env_src=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 local_env_py=/usr/bin/python3
-local_env_tool="$local_env_src/tests/support/pykmip_tool.py"
+local_env_tool="$local_env_src/tools/pykmip_tool.py"
 local_env_pids=()
 
 local_env_cleanup() {

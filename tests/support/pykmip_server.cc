@@ -14,7 +14,7 @@ namespace {
 const char* kPython = "/usr/bin/python3";
 const char* kServer = "/usr/bin/pykmip-server";
 
-std::string Tool() { return (SourceDir() / "tests/support/pykmip_tool.py").string(); }
+std::string Tool() { return (SourceDir() / "tools/pykmip_tool.py").string(); }
 
 }  // namespace
 

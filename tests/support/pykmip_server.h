@@ -1,6 +1,6 @@
 // Test harness around a real KMIP server (PyKMIP, Debian's python3-pykmip).
 //
-// TestPki makes throwaway certificates once (tests/support/pykmip_tool.py
+// TestPki makes throwaway certificates once (tools/pykmip_tool.py
 // lists them: "ca", "server", "client", "client2", "noeku", "other_ca",
 // "other_server", "other_client", "wronghost", "selfsigned"); Pem(name) and
 // Key(name) give the PEM texts, Path(name) the file.
