@@ -72,7 +72,7 @@ class ThrowingStore : public ConfigStore {
 class ConfigTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    real_ = SqliteConfigStore::Open(dir_.File("configstore.db"));
+    real_ = SqliteConfigStore::Open(dir_ / "configstore.db");
     store_ = std::make_shared<ThrowingStore>(real_);
     ConfigStore::SetGlobalStore(store_);
     Zyrd::ZyrApi::GetDaemonLogger()->SetLevel(5);

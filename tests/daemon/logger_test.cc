@@ -26,19 +26,20 @@ void RecordingLog(int level, const char* fmt, ...) {
   gCalls.push_back({level, fmt, buf});
 }
 
-TEST(LumoLoggerWrapper, MapsFrameworkLevels) {
+TEST(LumoLoggerWrapper, OneCallPerRecordAtTheMappedLevel) {
   const int expected[] = {7, 6, 5, 3, 2, 1};
   for (int level = 0; level <= 5; ++level) {
     EXPECT_EQ(Zyrd::ZyrApi::MapFrameworkLevel(level), expected[level]);
   }
-}
-
-TEST(LumoLoggerWrapper, OneCallPerRecordWithTheTextAsCollected) {
   ZyrdTest::LogCapture threshold(7);
   gCalls.clear();
   LumoLoggerWrapper wrapper(&RecordingLog);
-  LUMO_LOG(&wrapper, Lumo::Log::kInfo) << "Listening on: " << "127.0.0.1:7888";
-  LUMO_LOG(&wrapper, Lumo::Log::kDebug) << "Request received" << "[" << "1.2.3.4" << "]\n";
+  LUMO_LOG(&wrapper, Lumo::Log::kInfo) << "Listening on: "
+                                       << "127.0.0.1:7888";
+  LUMO_LOG(&wrapper, Lumo::Log::kDebug) << "Request received"
+                                        << "["
+                                        << "1.2.3.4"
+                                        << "]\n";
   ASSERT_EQ(gCalls.size(), 2u);
   EXPECT_EQ(gCalls[0].level, 5);
   EXPECT_EQ(gCalls[0].format, "%s");
@@ -68,11 +69,8 @@ TEST(LumoLoggerWrapperDeathTest, LevelAboveFiveIsNotReached) {
   EXPECT_DEATH(wrapper.CreateRecord(6), "NOT_REACHED daemon/logger:[0-9]+");
 }
 
-TEST(DaemonLogger, IsCreatedOnceAndReportsExceptionsAtWarning) {
+TEST(DaemonLogger, ReportsExceptionsAtWarningUnlessItsLevelIsBelow) {
   auto a = Zyrd::ZyrApi::GetDaemonLogger();
-  EXPECT_EQ(a, Zyrd::ZyrApi::GetDaemonLogger());
-  EXPECT_EQ(a->Name(), "zyrdLogger");
-
   ZyrdTest::LogCapture capture(7);
   a->SetLevel(5);
   Zyrd::ZyrApi::LogToDaemonLogger("disk full");

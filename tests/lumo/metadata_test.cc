@@ -4,6 +4,7 @@
 
 #include <boost/json/parse.hpp>
 #include <boost/json/serialize.hpp>
+#include <cstring>
 #include <fstream>
 #include <sstream>
 
@@ -78,23 +79,17 @@ TEST_F(MetadataTest, LoadFailuresSayWhat) {
   EXPECT_EQ(MetamodelProblem(kGood), "");
   EXPECT_EQ(MetamodelProblem("{"), "Unable to load metadata from " + dir_ +
                                        "/meta.json: not valid JSON (incomplete JSON)");
-  std::string text = kGood;
-  auto replaced = [&](const std::string& from, const std::string& to) {
-    std::string t = text;
-    t.replace(t.find(from), from.size(), to);
-    return t;
+  const std::tuple<const char*, const char*, const char*> edits[] = {
+      {R"({"enumeration": "s.h"})", R"({"enumeration": "s.x"})", "unknown enumeration 's.x'"},
+      {R"("type": "string")", R"("type": "text")", "unknown type 'text'"},
+      {R"({"id": "get", "params")", R"({"id": "get", "output": "void"}, {"id": "get", "params")",
+       "duplicate operation 's.svc.get'"},
   };
-  EXPECT_NE(MetamodelProblem(replaced(R"({"enumeration": "s.h"})", R"({"enumeration": "s.x"})"))
-                .find("unknown enumeration 's.x'"),
-            std::string::npos);
-  EXPECT_NE(MetamodelProblem(replaced(R"("type": "string")", R"("type": "text")"))
-                .find("unknown type 'text'"),
-            std::string::npos);
-  EXPECT_NE(
-      MetamodelProblem(replaced(R"({"id": "get", "params")", R"({"id": "get", "output": "void"},
-        {"id": "get", "params")"))
-          .find("duplicate operation 's.svc.get'"),
-      std::string::npos);
+  for (auto [from, to, problem] : edits) {
+    std::string text = kGood;
+    text.replace(text.find(from), strlen(from), to);
+    EXPECT_NE(MetamodelProblem(text).find(problem), std::string::npos) << problem;
+  }
 }
 
 TEST_F(MetadataTest, AuthorizationRulesAreCheckedWhenLoaded) {

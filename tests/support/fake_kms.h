@@ -1,6 +1,7 @@
 // A scriptable key server client and provider lookup for service tests.
 #pragma once
 
+#include <atomic>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -13,7 +14,7 @@
 namespace ZyrdTest {
 
 // Each server answers every key operation with its scripted result; the
-// servers that were asked are recorded in order.
+// servers that were asked are recorded in order, status updates counted.
 class FakeKms : public Zyrd::Kms::Kms {
  public:
   struct Server {
@@ -69,7 +70,7 @@ class FakeKms : public Zyrd::Kms::Kms {
   Zyrd::Kms::KmsResult GetRemoteServerCertificate(uint32_t, std::string&, std::string&) override {
     return Zyrd::Kms::OtherFailure;
   }
-  void UpdateStatus() override {}
+  void UpdateStatus() override { ++updates; }
   void GetStatus(Zyrd::Kms::KmsStatus&) override {}
 
  private:
@@ -83,6 +84,9 @@ class FakeKms : public Zyrd::Kms::Kms {
   mutable std::mutex mutex_;
   std::vector<uint32_t> asked_;
   std::vector<uint32_t> keyLengths_;
+
+ public:
+  std::atomic<int> updates{0};
 };
 
 class FakeProviders : public Zyrd::State::ProviderLookup {
