@@ -52,6 +52,7 @@ def call(env, method, params, token=None):
     records = audit_records(env.root, before + 1)
     assert len(records) == before + 1 and records[-1]["eventId"] == "api.call"
     assert records[-1]["success"] is (name is None), (records[-1], response)
+    assert records[-1]["opId"] not in [r["opId"] for r in records[:-1]]
     return name, response
 
 

@@ -102,11 +102,6 @@ TEST_F(FakeServerTest, ServerFailuresAndMissingValues) {
   EXPECT_EQ(qlc_value_of("Symmetric_Key/Key", r.r, "bs", &bytes, &length), QLC_E_NOT_FOUND);
   EXPECT_TRUE(bytes == nullptr && length == -1);
 
-  server_.SetHandler(Answer(Kmip::Versions({})));
-  auto none = Run("Query, Versions");
-  EXPECT_EQ(none.number(), 0);
-  EXPECT_EQ(qlc_find("Versions", none.r), nullptr);
-  EXPECT_EQ(qlc_find("Versions/", none.r), nullptr);
 }
 
 TEST_F(FakeServerTest, MalformedAnswersKeepTheSessionOnlyWhileFramingHolds) {

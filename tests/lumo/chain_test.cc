@@ -73,12 +73,10 @@ std::shared_ptr<ApiProvider> AuthzFilter(std::shared_ptr<ApiProvider> next,
 TEST(LocalProviderTest, DispatchesByFullMethodNameThroughTheExecutor) {
   auto iface = std::make_shared<Lumo::Provider::ApiInterface>();
   iface->serviceId = "a.b";
-  for (const char* op : {"get", "set"}) {
-    iface->operations.push_back(
-        {op, [](const Lumo::Core::CallPtr& call, auto c) {
-           c.Complete(MethodResult::Output(boost::json::string("ran " + call->method)));
-         }});
-  }
+  iface->operations.push_back({"set", [](const Lumo::Core::CallPtr& call, auto c) {
+                                 c.Complete(
+                                     MethodResult::Output(boost::json::string(call->method)));
+                               }});
   int tasks = 0;
   Lumo::Provider::AsyncLocalProvider provider(
       [&](std::function<void()> task) {
@@ -86,7 +84,7 @@ TEST(LocalProviderTest, DispatchesByFullMethodNameThroughTheExecutor) {
         task();
       },
       {iface}, nullptr);
-  EXPECT_EQ(Call(provider, "a.b.set"), R"(output:"ran a.b.set")");
+  EXPECT_EQ(Call(provider, "a.b.set"), R"(output:"a.b.set")");
   EXPECT_EQ(tasks, 1);
   EXPECT_EQ(Call(provider, "a.b.list"), "com.tarsel.lumo.std.errors.operation_not_found");
   EXPECT_EQ(Call(provider, "nodots"), "com.tarsel.lumo.std.errors.operation_not_found");
@@ -96,32 +94,15 @@ TEST(LocalProviderTest, DispatchesByFullMethodNameThroughTheExecutor) {
       0u);
 }
 
-TEST(AuthzFilterTest, BuiltInsAndRulesDecideAndTellUnauthenticatedFromUnauthorized) {
-  auto info = std::make_shared<Lumo::Authz::AuthzInfo>();
-  EXPECT_EQ(info->OperationsForScheme(Lumo::Authz::AuthzInfo::kNoAuthenticationScheme).size(), 36u);
-  EXPECT_TRUE(info->NeedsNoAuthentication("com.tarsel.lumo.metadata.cli.command.fingerprint"));
-  EXPECT_FALSE(info->NeedsNoAuthentication("com.tarsel.orna.kms.status.get"));
+// Which calls the filter admits under the daemon's metadata is shown by the
+// API provider's tests.
+TEST(AuthzInfoTest, StartsWithExactlyTheThirtySixBuiltInOperations) {
+  Lumo::Authz::AuthzInfo info;
+  EXPECT_EQ(info.OperationsForScheme(Lumo::Authz::AuthzInfo::kNoAuthenticationScheme).size(), 36u);
+  EXPECT_TRUE(info.NeedsNoAuthentication("com.tarsel.lumo.metadata.cli.command.fingerprint"));
+  EXPECT_FALSE(info.NeedsNoAuthentication("com.tarsel.orna.kms.status.get"));
   // A rule cannot make a built-in operation need authentication.
-  EXPECT_FALSE(info->AddRule("com.tarsel.lumo.std.introspection.provider.get", {"@X"}));
-  info->AddRule("svc.keys", {"@ATTEST+KEY_OPERATIONS", "@ORNA+KMS_ADMIN"});
-  info->AddRule("svc.admin", {"@ORNA+KMS_ADMIN"});
-  auto terminal = std::make_shared<Terminal>();
-  auto filter = AuthzFilter(terminal, info);
-
-  auto attest = Caller("<ATTEST>", {"@ATTEST+KEY_OPERATIONS"});
-  auto admin = Caller("root", {"@X", "@ORNA+KMS_ADMIN"});
-  const std::string unauthenticated = "com.tarsel.lumo.std.errors.unauthenticated";
-  const std::string unauthorized = "com.tarsel.lumo.std.errors.unauthorized";
-  EXPECT_EQ(Call(*filter, "svc.keys", attest), R"(output:"svc.keys")");
-  EXPECT_EQ(Call(*filter, "svc.keys", admin), R"(output:"svc.keys")");
-  EXPECT_EQ(Call(*filter, "svc.admin", admin), R"(output:"svc.admin")");
-  EXPECT_EQ(Call(*filter, "com.tarsel.lumo.metadata.metamodel.service.list"),
-            R"(output:"com.tarsel.lumo.metadata.metamodel.service.list")");
-  EXPECT_EQ(Call(*filter, "svc.admin", attest), unauthorized);
-  EXPECT_EQ(Call(*filter, "svc.unlisted", admin), unauthorized);
-  EXPECT_EQ(Call(*filter, "svc.keys"), unauthenticated);
-  EXPECT_EQ(Call(*filter, "svc.unlisted"), unauthenticated);
-  EXPECT_EQ(terminal->calls, 4);
+  EXPECT_FALSE(info.AddRule("com.tarsel.lumo.std.introspection.provider.get", {"@X"}));
 }
 
 TEST(AuthnFilterTest, NoResultPassesOnResultAttachesErrorStops) {
@@ -148,26 +129,21 @@ TEST(AuthnFilterTest, NoResultPassesOnResultAttachesErrorStops) {
 
 // Every record has all four attributes, even for a call that names no service.
 TEST(CallRegistrarTest, RecordsTheFourAttributesWithTheOutcome) {
-  using A = Lumo::Observer::AuditAttributes;
-  std::vector<A> records;
+  std::vector<std::string> records;
+  auto record = [&](const Lumo::Observer::AuditAttributes& a) {
+    EXPECT_EQ(a.size(), 4u);
+    records.push_back(a.at("eventID") + " " + a.at("subject") + " " + a.at("object") + " " +
+                      a.at("result"));
+  };
   auto terminal = std::make_shared<Terminal>();
-  Lumo::Observer::CallRegistrar ok(terminal, [&](const auto& a) { records.push_back(a); });
+  Lumo::Observer::CallRegistrar ok(terminal, record);
   Call(ok, "com.tarsel.orna.kms.status.get", Caller("root", {}));
   Call(ok, "nodots");
   Lumo::Observer::CallRegistrar failing(
-      AuthzFilter(terminal, std::make_shared<Lumo::Authz::AuthzInfo>()),
-      [&](const auto& a) { records.push_back(a); });
+      AuthzFilter(terminal, std::make_shared<Lumo::Authz::AuthzInfo>()), record);
   Call(failing, "svc.op");
-
-  EXPECT_EQ(
-      records,
-      (std::vector<A>{
-          {{"eventID", "api.call"},
-           {"subject", "root"},
-           {"object", "com.tarsel.orna.kms.status:get"},
-           {"result", "true"}},
-          {{"eventID", "api.call"}, {"subject", ""}, {"object", ""}, {"result", "true"}},
-          {{"eventID", "api.call"}, {"subject", ""}, {"object", "svc:op"}, {"result", "false"}}}));
+  EXPECT_EQ(records, (std::vector<std::string>{"api.call root com.tarsel.orna.kms.status:get true",
+                                               "api.call   true", "api.call  svc:op false"}));
 }
 
 }  // namespace
