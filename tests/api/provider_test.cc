@@ -58,15 +58,6 @@ class ApiProviderTest : public ::testing::Test {
   }
   void TearDown() override { Tsl::Audit::SetAuditSink(nullptr); }
 
-  // Posts one JSON-RPC call; returns the parsed response body.
-  value Post(const std::string& method, const std::string& params, const std::string& token = "") {
-    return boost::json::parse(chain_
-                                  ->Send(R"({"jsonrpc":"2.0","id":1,"method":")" + method +
-                                             R"(","params":)" + params + "}",
-                                         token)
-                                  .body);
-  }
-
   ZyrdTest::LogCapture log_{5};
   ZyrdTest::FakeClock clock_;
   Zyrd::Stats::KeyStats stats_{clock_};
@@ -75,8 +66,8 @@ class ApiProviderTest : public ::testing::Test {
   std::unique_ptr<ZyrdTest::ApiChain> chain_;
 };
 
-// Each call's outcome (the output, the error name in the body and the
-// header, or the JSON-RPC error) and its audit record.
+// Each call's outcome (what the output holds, the error name in the body and
+// the header, or the JSON-RPC error) and its audit record.
 TEST_F(ApiProviderTest, CallsAndTheirOutcomesThroughTheWholeChain) {
   const std::string attest = ZyrdTest::TokenBuilder::Valid(kNow).Sign();
   const std::string expired = ZyrdTest::TokenBuilder::Valid(kNow).Exp(kNow - 1).Sign();
@@ -106,6 +97,11 @@ TEST_F(ApiProviderTest, CallsAndTheirOutcomesThroughTheWholeChain) {
       {"com.tarsel.orna.kms.nothing.here", "{}", admin, e + "unauthorized"},
       {ops + "generate_key", R"({"provider":"p1","keysize":32})", attest,
        "Invalid params: field 'keySize': missing"},
+      // Metadata and introspection need no token.
+      {"com.tarsel.lumo.std.introspection.provider.get", "{}", "", R"("id":"AsyncLocalProvider")"},
+      {"com.tarsel.lumo.std.introspection.operation.get",
+       R"({"serviceId":"com.tarsel.orna.kms.key_operation","operationId":"decrypt"})", "",
+       R"({"name":"wrappedKey")"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.method + " " + c.params);
@@ -120,7 +116,7 @@ TEST_F(ApiProviderTest, CallsAndTheirOutcomesThroughTheWholeChain) {
                           : body.at("result").as_object().contains("error")
                               ? std::string(body.at("result").at("error").at("name").as_string())
                               : boost::json::serialize(body.at("result"));
-    EXPECT_EQ(outcome, c.outcome);
+    EXPECT_NE(outcome.find(c.outcome), std::string::npos) << outcome;
     EXPECT_EQ(result.errorName, outcome.rfind(e, 0) == 0 ? outcome : "");
     ASSERT_EQ(audit_.lines.size(), 1u);
     EXPECT_EQ(audit_.lines[0].at("success").as_bool(), outcome[0] == '{');
@@ -129,16 +125,6 @@ TEST_F(ApiProviderTest, CallsAndTheirOutcomesThroughTheWholeChain) {
         c.method.substr(0, c.method.rfind('.')) + ":" + c.method.substr(c.method.rfind('.') + 1));
   }
   EXPECT_EQ(log_.Count("GenerateKey failed on provider p1 server s1"), 2u);
-}
-
-TEST_F(ApiProviderTest, MetadataAndIntrospectionNeedNoToken) {
-  value services = Post("com.tarsel.lumo.metadata.metamodel.service.list", "{}");
-  EXPECT_EQ(services.at("result").at("output").as_array().size(), 10u);
-  value provider = Post("com.tarsel.lumo.std.introspection.provider.get", "{}");
-  EXPECT_EQ(provider.at("result").at("output").at("id").as_string(), "AsyncLocalProvider");
-  value op = Post("com.tarsel.lumo.std.introspection.operation.get",
-                  R"({"serviceId":"com.tarsel.orna.kms.key_operation","operationId":"decrypt"})");
-  EXPECT_EQ(op.at("result").at("output").at("params").at(1).at("name").as_string(), "wrappedKey");
 }
 
 // The metadata file names every operation the daemon binds, and gives each

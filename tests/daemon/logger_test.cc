@@ -69,16 +69,4 @@ TEST(LumoLoggerWrapperDeathTest, LevelAboveFiveIsNotReached) {
   EXPECT_DEATH(wrapper.CreateRecord(6), "NOT_REACHED daemon/logger:[0-9]+");
 }
 
-TEST(DaemonLogger, ReportsExceptionsAtWarningUnlessItsLevelIsBelow) {
-  auto a = Zyrd::ZyrApi::GetDaemonLogger();
-  ZyrdTest::LogCapture capture(7);
-  a->SetLevel(5);
-  Zyrd::ZyrApi::LogToDaemonLogger("disk full");
-  EXPECT_TRUE(capture.Has(3, "zyrdLogger: disk full\n"));
-  a->SetLevel(2);
-  capture.Clear();
-  Zyrd::ZyrApi::LogToDaemonLogger("ignored");
-  EXPECT_TRUE(capture.Lines().empty());
-}
-
 }  // namespace

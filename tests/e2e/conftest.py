@@ -10,7 +10,7 @@ from harness import Daemon, KmipServer  # noqa: E402
 
 @pytest.fixture
 def start_daemon():
-    """Starts daemons under given roots; kills whatever is left at the end."""
+    # Starts daemons under given roots; kills whatever is left at the end.
     started = []
 
     def start(root, env=None):
@@ -24,7 +24,7 @@ def start_daemon():
 
 @pytest.fixture(scope="module")
 def kmip_server(tmp_path_factory):
-    """A started PyKMIP server shared by the tests of one module."""
+    # A started PyKMIP server shared by the tests of one module.
     server = KmipServer(tmp_path_factory.mktemp("kmip")).start()
     yield server
     server.stop()

@@ -1,5 +1,5 @@
-"""Real processes for black-box tests: zyrd under a scratch root, a PyKMIP
-server with a throwaway PKI, a JSON-RPC client, and the developer tools."""
+# Real processes for black-box tests: zyrd under a scratch root, a PyKMIP
+# server with a throwaway PKI, a JSON-RPC client, and the developer tools.
 
 import http.client
 import json
@@ -21,7 +21,7 @@ import pykmip_tool  # noqa: E402
 
 
 def free_port():
-    """A 127.0.0.1 port nothing listens on (it was free a moment ago)."""
+    # A 127.0.0.1 port nothing listens on (it was free a moment ago).
     with socket.socket() as s:
         s.bind(("127.0.0.1", 0))
         return s.getsockname()[1]
@@ -35,8 +35,8 @@ def write_config(root, body):
 
 
 class Daemon:
-    """A zyrd process on a free port (unless env names one) with the metadata
-    installed under root; its standard error is collected line by line."""
+    # A zyrd process on a free port (unless env names one) with the metadata
+    # installed under root; its standard error is collected line by line.
 
     def __init__(self, root, env=None):
         metadata = pathlib.Path(root) / "usr/lib/tarsel/lumo/zyr_lumo_metadata.json"
@@ -63,7 +63,7 @@ class Daemon:
             return list(self._lines)
 
     def wait_for(self, fragment, timeout=10.0):
-        """Returns the first line containing fragment, or fails."""
+        # Returns the first line containing fragment, or fails.
         deadline = time.monotonic() + timeout
         with self._cond:
             while True:
@@ -80,7 +80,7 @@ class Daemon:
         return int(self.wait_for("HTTP endpoint listening on TCP port ").rsplit(" ", 1)[1])
 
     def handles_sigterm(self):
-        """Whether the process has installed its SIGTERM handler (start-up done)."""
+        # Whether the process has installed its SIGTERM handler (start-up done).
         try:
             with open("/proc/%d/status" % self.proc.pid) as f:
                 caught = next(line for line in f if line.startswith("SigCgt:")).split()[1]
@@ -89,7 +89,7 @@ class Daemon:
             return False
 
     def stop(self, sig=signal.SIGTERM, timeout=10.0):
-        """Waits for the end of start-up, signals, and returns the exit status."""
+        # Waits for the end of start-up, signals, and returns the exit status.
         deadline = time.monotonic() + timeout
         while not self.handles_sigterm():
             if self.proc.poll() is not None or time.monotonic() > deadline:
@@ -109,8 +109,8 @@ class Daemon:
 
 
 class KmipServer:
-    """PyKMIP on a free 127.0.0.1 port; certificates are cert_path(name) and
-    key_path(name) (pykmip_tool.PKI_NAMES). Always stop() it."""
+    # PyKMIP on a free 127.0.0.1 port; certificates are cert_path(name) and
+    # key_path(name) (pykmip_tool.PKI_NAMES). Always stop() it.
 
     def __init__(self, workdir):
         self.pki = pathlib.Path(workdir) / "pki"
@@ -157,8 +157,8 @@ class KmipServer:
                 self.proc.wait()
 
     def admin(self, *commands):
-        """Runs commands (pykmip_tool.Admin.run word lists) as client "client"
-        in one session; returns their outputs."""
+        # Runs commands (pykmip_tool.Admin.run word lists) as client "client"
+        # in one session; returns their outputs.
         admin = pykmip_tool.Admin(self.pki, self.port)
         try:
             return [admin.run(list(c)) for c in commands]
@@ -166,21 +166,21 @@ class KmipServer:
             admin.close()
 
     def create_key(self, bits):
-        """An active AES key of `bits` bits; returns its id."""
+        # An active AES key of `bits` bits; returns its id.
         uid = self.admin(("create", str(bits)))[0]
         self.admin(("activate", uid))
         return uid
 
 
 class Client:
-    """One kept-alive HTTP connection to a daemon."""
+    # One kept-alive HTTP connection to a daemon.
 
     def __init__(self, port):
         self.conn = http.client.HTTPConnection("127.0.0.1", port, timeout=30)
         self.next_id = 1
 
     def call(self, method, params=None, token=None):
-        """Returns (lumo-error header or None, the decoded JSON-RPC response)."""
+        # Returns (lumo-error header or None, the decoded JSON-RPC response).
         body = {"jsonrpc": "2.0", "id": self.next_id, "method": method}
         self.next_id += 1
         if params is not None:
@@ -196,14 +196,14 @@ class Client:
 
 
 def seed(root, spec):
-    """Stores providers (and the attestation certificate) in the root's store."""
+    # Stores providers (and the attestation certificate) in the root's store.
     subprocess.run([str(TOOLS / "zyrd-seed"), "--cfgvault", str(BUILD_DIR / "cfgvault"), "-"],
                    input=json.dumps(spec).encode(), check=True,
                    env={"ZYRD_ROOT": str(root), "PATH": "/usr/bin:/bin"})
 
 
 def make_attestation_key(directory):
-    """Returns the private key's path and the certificate's text."""
+    # Returns the private key's path and the certificate's text.
     subprocess.run([str(TOOLS / "make-attestation-key"), str(directory)], check=True,
                    stdout=subprocess.DEVNULL)
     d = pathlib.Path(directory)
@@ -217,8 +217,8 @@ def mint(key_path, *args):
 
 
 def audit_records(root, at_least=0, timeout=5.0):
-    """The audit records so far; waits until there are `at_least` of them
-    (a call's record is written as it completes, around its response)."""
+    # The audit records so far; waits until there are `at_least` of them
+    # (a call's record is written as it completes, around its response).
     path = pathlib.Path(root) / "var/log/zyrd/audit.log"
     deadline = time.monotonic() + timeout
     while True:

@@ -1,4 +1,4 @@
-"""The store's command-line tool, and the daemon's restore of a seeded store."""
+# The store's command-line tool, and the daemon's restore of a seeded store.
 
 import json
 import os

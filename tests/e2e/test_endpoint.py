@@ -1,4 +1,4 @@
-"""The daemon's HTTP endpoint on the loopback addresses."""
+# The daemon's HTTP endpoint on the loopback addresses.
 
 import json
 import socket

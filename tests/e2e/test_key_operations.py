@@ -1,5 +1,5 @@
-"""Key operations end to end: a real daemon over HTTP with a real KMIP server.
-Every call is checked to write one audit record with the right success flag."""
+# Key operations end to end: a real daemon over HTTP with a real KMIP server.
+# Every call is checked to write one audit record with the right success flag.
 
 import base64
 import hashlib
@@ -20,7 +20,7 @@ ERRORS = "com.tarsel.lumo.std.errors."
 
 @pytest.fixture(scope="module")
 def env(kmip_server, tmp_path_factory, request):
-    """A daemon with providers on the shared KMIP server, and a token key."""
+    # A daemon with providers on the shared KMIP server, and a token key.
     root = tmp_path_factory.mktemp("root")
     key_path, cert = make_attestation_key(tmp_path_factory.mktemp("attest"))
     active, deact = kmip_server.create_key(256), kmip_server.create_key(256)
@@ -45,8 +45,8 @@ def env(kmip_server, tmp_path_factory, request):
 
 
 def call(env, method, params, token=None):
-    """(lumo-error header or None, response) of a call with the attestation
-    token unless another (or "" for none) is given."""
+    # (lumo-error header or None, response) of a call with the attestation
+    # token unless another (or "" for none) is given.
     before = len(audit_records(env.root))
     name, response = env.client.call(method, params, env.token if token is None else token)
     records = audit_records(env.root, before + 1)
@@ -109,7 +109,7 @@ def test_argument_and_lookup_errors(env):
 
 
 def hs256(secret, claims):
-    """An HS256 JWT made by hand: the JWT library refuses PEM texts as secrets."""
+    # An HS256 JWT made by hand: the JWT library refuses PEM texts as secrets.
     def b64url(data):
         return base64.urlsafe_b64encode(data).rstrip(b"=")
     signing_input = (b64url(json.dumps({"alg": "HS256", "typ": "JWT"}).encode()) + b"." +

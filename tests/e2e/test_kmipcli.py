@@ -1,4 +1,4 @@
-"""kmipcli, the operators' diagnostic tool, against a real KMIP server."""
+# kmipcli, the operators' diagnostic tool, against a real KMIP server.
 
 import hashlib
 import subprocess

@@ -1,5 +1,5 @@
-"""The daemon starts with its configuration, runs until a signal and leaves
-through one exit path."""
+# The daemon starts with its configuration, runs until a signal and leaves
+# through one exit path.
 
 import signal
 

@@ -26,18 +26,4 @@ TEST(FormatTemplate, FillsNamedPlaceholdersAndLeavesTheRestAsWritten) {
   }
 }
 
-TEST(Localizer, ResolvesThenFormatsAndKeepsArguments) {
-  Lumo::L10n::Localizer localizer({"en_US"}, [](const std::string& id, const std::string& locale) {
-    EXPECT_EQ(locale, "en_US");
-    return id == "greet" ? std::string("Hello {who}.") : std::string("?");
-  });
-  Lumo::NamedMessageBuilder builder("greet");
-  builder.Arg("who", "world").Arg("unused", "x");
-  auto msg = localizer.Localize(builder);
-  EXPECT_EQ(msg.id, "greet");
-  EXPECT_EQ(msg.defaultMessage, "Hello world.");
-  ASSERT_EQ(msg.args.size(), 2u);
-  EXPECT_EQ(msg.args[1].name, "unused");
-}
-
 }  // namespace

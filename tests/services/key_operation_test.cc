@@ -66,8 +66,8 @@ TEST_F(KeyOperationTest, FirstServerThatSucceedsAnswersAfterOneWarningPerFailure
   auto kms = AddProvider("p1", {{"s1", KeyServerTimeout}, {"s2"}, {"s3"}});
   MethodResult r = Generate("p1", 32);
   EXPECT_EQ(Describe(r), R"(output {"wrappedKey":"wrapped-by-s2","key":"a2V5LWZyb20ts2"})");
-  EXPECT_EQ(kms->Asked(), (std::vector<uint32_t>{0, 1}));
-  EXPECT_EQ(kms->KeyLengths(), (std::vector<uint32_t>{32, 32}));
+  EXPECT_EQ(kms->asked, (std::vector<uint32_t>{0, 1}));
+  EXPECT_EQ(kms->keyLengths, (std::vector<uint32_t>{32, 32}));
   EXPECT_TRUE(log_.Has(
       3, "GenerateKey failed on provider p1 server s1 scripted failure, trying next server\n"));
   EXPECT_EQ(log_.Count("trying next server"), 1u);
@@ -89,7 +89,7 @@ TEST_F(KeyOperationTest, WhenEveryServerFailsTheLastServersErrorIsReported) {
       3, "Decrypt failed on provider p1 server s1 scripted failure, trying next server\n"));
   EXPECT_TRUE(log_.Has(
       3, "Decrypt failed on provider p1 server s2 scripted failure, trying next server\n"));
-  EXPECT_EQ(kms->Asked(), (std::vector<uint32_t>{0, 1, 0, 1}));
+  EXPECT_EQ(kms->asked, (std::vector<uint32_t>{0, 1, 0, 1}));
   EXPECT_EQ(stats_.Snapshot().failureCount, 2u);
 }
 
@@ -113,7 +113,7 @@ TEST_F(KeyOperationTest, ProvidersThatCannotAnswer) {
       "com.tarsel.lumo.std.errors.not_found com.tarsel.orna.kms.providers.not_found provider=nope";
   EXPECT_EQ(Describe(Generate("", 32)), invalid);
   EXPECT_EQ(Describe(Decrypt("", "w")), invalid);
-  EXPECT_EQ(providers_->Lookups(), 0u);
+  EXPECT_EQ(providers_->lookups, 0u);
   EXPECT_TRUE(log_.Has(2, "Generate key called on an empty provider\n"));
   EXPECT_TRUE(log_.Has(2, "Decrypt called on an empty provider\n"));
 
@@ -128,7 +128,7 @@ TEST_F(KeyOperationTest, ProvidersThatCannotAnswer) {
       "com.tarsel.lumo.std.errors.error com.tarsel.orna.kms.keyoperationsvc.generatekey.error");
   EXPECT_EQ(Describe(Decrypt("empty", "w")),
             "com.tarsel.lumo.std.errors.error com.tarsel.orna.kms.keyoperationsvc.decrypt.error");
-  EXPECT_TRUE(kms->Asked().empty());
+  EXPECT_TRUE(kms->asked.empty());
   EXPECT_EQ(stats_.Snapshot().failureCount, 6u);
 }
 
@@ -141,13 +141,13 @@ TEST_F(KeyOperationTest, KeySizeOutsideOneTo65535IsRefusedBeforeAnyServer) {
               "com.tarsel.orna.kms.providers.invalid_argument "
               "parameter=keySize");
   }
-  EXPECT_EQ(providers_->Lookups(), 0u);
-  EXPECT_TRUE(kms->Asked().empty());
+  EXPECT_EQ(providers_->lookups, 0u);
+  EXPECT_TRUE(kms->asked.empty());
   EXPECT_EQ(stats_.Snapshot().failureCount, 4u);
 
   EXPECT_TRUE(Generate("p1", 1).IsOutput());
   EXPECT_TRUE(Generate("p1", 65535).IsOutput());
-  EXPECT_EQ(kms->KeyLengths(), (std::vector<uint32_t>{1, 65535}));
+  EXPECT_EQ(kms->keyLengths, (std::vector<uint32_t>{1, 65535}));
 }
 
 TEST_F(KeyOperationTest, EncryptIsTheBareErrorAndIsNotCounted) {

@@ -2,6 +2,7 @@
 // program through tests/support/with_pykmip.py, which starts the server on a
 // free 127.0.0.1 port with a throwaway PKI, creates the keys, and stops it
 // when the program ends; what the program needs comes in the environment.
+// Programs that need only the certificates run with the PKI alone.
 //
 // PKI names (tools/pykmip_tool.py): "ca", "server", "client", "client2",
 // "noeku", "other_ca", "other_server", "other_client", "wronghost",

@@ -1,13 +1,14 @@
-"""Runs a test program beside a real KMIP server and returns its exit status."""
+# Runs a test program beside a real KMIP server and returns its exit status.
 
-# usage: /usr/bin/python3 with_pykmip.py PROGRAM [ARGS...]
+# usage: /usr/bin/python3 with_pykmip.py [--pki-only] PROGRAM [ARGS...]
 #
-# Starts PyKMIP on a free 127.0.0.1 port with a throwaway PKI, creates the
+# Makes a throwaway PKI, starts PyKMIP on a free 127.0.0.1 port, creates the
 # keys below as client "client", runs the program with
 #   ZYRD_TEST_PKI        the PKI directory (<name>.pem, <name>.key)
 #   ZYRD_TEST_KMIP_PORT  the server's port
 #   ZYRD_TEST_KEYS       "name=id:hex ..." for each key (hex: the key bytes)
 # and always stops the server afterwards (tests/support/kmip_env.h reads them).
+# With --pki-only there is no server: only the PKI is handed over.
 
 import os
 import pathlib
@@ -32,16 +33,20 @@ KEYS = {
 
 
 def main(argv):
+    pki_only = argv[:1] == ["--pki-only"]
     with tempfile.TemporaryDirectory(prefix="zyrd-kmip-") as tmp:
-        server = KmipServer(tmp).start()
+        server = KmipServer(tmp)
+        env = dict(os.environ, ZYRD_TEST_PKI=str(server.pki))
+        if pki_only:
+            return subprocess.run(argv[1:], env=env).returncode
+        server.start()
         try:
             keys = []
             for name, (bits, steps) in KEYS.items():
                 uid = server.admin(("create", str(bits)))[0]
                 key = server.admin(("get", uid), *[(verb, uid, *rest) for verb, *rest in steps])[0]
                 keys.append("%s=%s:%s" % (name, uid, key))
-            env = dict(os.environ, ZYRD_TEST_PKI=str(server.pki),
-                       ZYRD_TEST_KMIP_PORT=str(server.port), ZYRD_TEST_KEYS=" ".join(keys))
+            env.update(ZYRD_TEST_KMIP_PORT=str(server.port), ZYRD_TEST_KEYS=" ".join(keys))
             return subprocess.run(argv, env=env).returncode
         finally:
             server.stop()

@@ -2,8 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include "platform/util/paths.h"
-
 namespace {
 
 std::string Encode(std::string_view in) {
@@ -37,14 +35,6 @@ TEST(Base64, RefusesSmallBuffersAndMalformedText) {
   for (const char* bad : {"Zg=", "Zg=a", "Z===", "Zm9v!A==", "=Zm9", "Zg==Zg==", "Zm 9v"}) {
     EXPECT_FALSE(Base64_Decode(bad, &decoded)) << bad;
   }
-}
-
-TEST(RootPath, PlacesAbsolutePathsUnderZyrdRoot) {
-  unsetenv("ZYRD_ROOT");
-  EXPECT_EQ(Groundwork::RootPath("/var/lib/zyrd/configstore.db"), "/var/lib/zyrd/configstore.db");
-  setenv("ZYRD_ROOT", "/tmp/run/", 1);
-  EXPECT_EQ(Groundwork::RootPath("/etc/x.xml"), "/tmp/run/etc/x.xml");
-  unsetenv("ZYRD_ROOT");
 }
 
 }  // namespace
