@@ -136,27 +136,15 @@ TEST(KmipResponse, ChecksTheEnvelope) {
             "message 'Denied? for 'bob''");
 }
 
-TEST(KmipResponse, TreesOfferTheDocumentedPaths) {
+// The paths on real responses are shown through the library's sessions;
+// these are the version texts and the empty cases.
+TEST(KmipResponse, VersionTreesAndMissingPaths) {
   std::string error;
   auto treeOf = [&](const Bytes& message) {
     Response r;
     EXPECT_TRUE(Qlc::DecodeResponse(message, OperationOf(message), &r, &error)) << error;
     return Qlc::BuildTree(OperationOf(message), r.payload);
   };
-  auto key = treeOf(Kmip::Key("k", Bytes{9, 8, 7}));
-  const Qlc::Node* n = Qlc::FindPath(key->root, "Symmetric_Key/Key", &error);
-  ASSERT_NE(n, nullptr) << error;
-  EXPECT_EQ(Bytes(n->bytes.begin(), n->bytes.end()), (Bytes{9, 8, 7}));
-  EXPECT_EQ(Qlc::FindPath(key->root, "Symmetric_Key/Length", &error)->integer, 24);
-
-  auto noKey = treeOf(Kmip::Key("k", {}, /*withMaterial=*/false));
-  EXPECT_NE(Qlc::FindPath(noKey->root, "Symmetric_Key", &error), nullptr);
-  EXPECT_EQ(Qlc::FindPath(noKey->root, "Symmetric_Key/Key", &error), nullptr);
-  EXPECT_EQ(error, "no 'Symmetric_Key/Key' in the response");
-
-  EXPECT_EQ(Qlc::FindPath(treeOf(Kmip::State("k", 6))->root, "Attributes/State", &error)->integer,
-            6);
-
   auto versions = treeOf(Kmip::Versions({{1, 4}, {1, 10}}));
   std::vector<std::string> texts;
   for (auto* v = Qlc::FindPath(versions->root, "Versions/", &error); v; v = v->next) {
@@ -166,6 +154,9 @@ TEST(KmipResponse, TreesOfferTheDocumentedPaths) {
   auto none = treeOf(Kmip::Versions({}));
   EXPECT_EQ(Qlc::FindPath(none->root, "Versions", &error), nullptr);
   EXPECT_EQ(Qlc::FindPath(none->root, "Versions//x", &error), nullptr);
+  EXPECT_EQ(Qlc::FindPath(treeOf(Kmip::Key("k", {}, false))->root, "Symmetric_Key/Key", &error),
+            nullptr);
+  EXPECT_EQ(error, "no 'Symmetric_Key/Key' in the response");
 }
 
 }  // namespace

@@ -49,7 +49,7 @@ class LoopbackServer {
   std::mutex mutex_;
   std::set<int> open_;
   std::vector<std::thread> workers_;
-  bool stopped_ = false;
+  std::atomic<bool> stopped_{false};
 };
 
 // What the fake KMIP server does with one request.
