@@ -9,7 +9,7 @@ import signal
 import socket
 import subprocess
 import sys
-import threading
+import tempfile
 import time
 
 BUILD_DIR = pathlib.Path(os.environ.get("ZYRD_BUILD_DIR", "build")).resolve()
@@ -36,45 +36,38 @@ def write_config(root, body):
 
 class Daemon:
     # A zyrd process on a free port (unless env names one) with the metadata
-    # installed under root; its standard error is collected line by line.
+    # installed under root; its standard error goes to a zyrd-*.log there.
 
     def __init__(self, root, env=None):
         metadata = pathlib.Path(root) / "usr/lib/tarsel/lumo/zyr_lumo_metadata.json"
         metadata.parent.mkdir(parents=True, exist_ok=True)
         metadata.write_bytes((SOURCE_DIR / "metadata/zyr_lumo_metadata.json").read_bytes())
         env = {**os.environ, "ZYRD_ROOT": str(root), "ZYRD_HTTP_PORT": "0", **(env or {})}
+        fd, self.log = tempfile.mkstemp(prefix="zyrd-", suffix=".log", dir=root)
+        self.log = pathlib.Path(self.log)
         self.proc = subprocess.Popen([str(BUILD_DIR / "zyrd")], stdin=subprocess.DEVNULL,
-                                     stdout=subprocess.DEVNULL, stderr=subprocess.PIPE, env=env)
-        self._lines = []
-        self._cond = threading.Condition()
-        self._reader = threading.Thread(target=self._read, daemon=True)
-        self._reader.start()
-
-    def _read(self):
-        for raw in self.proc.stderr:
-            with self._cond:
-                self._lines.append(raw.decode("utf-8", "replace").rstrip("\n"))
-                self._cond.notify_all()
-        with self._cond:
-            self._cond.notify_all()
+                                     stdout=subprocess.DEVNULL, stderr=fd, env=env)
+        os.close(fd)
 
     def lines(self):
-        with self._cond:
-            return list(self._lines)
+        return self.log.read_text(errors="replace").splitlines()
 
-    def wait_for(self, fragment, timeout=10.0):
-        # Returns the first line containing fragment, or fails.
+    def _until(self, done, what, timeout=10.0):
+        # Polls done() until it holds; fails when the daemon ended or time ran out.
         deadline = time.monotonic() + timeout
-        with self._cond:
-            while True:
-                found = [line for line in self._lines if fragment in line]
-                if found:
-                    return found[0]
-                left = deadline - time.monotonic()
-                if left <= 0 or (self.proc.poll() is not None and not self._reader.is_alive()):
-                    raise AssertionError("no line with %r; got:\n%s" % (fragment,
-                                                                       "\n".join(self._lines)))
-                self._cond.wait(min(left, 0.1))
+        while not done():
+            if self.proc.poll() is not None or time.monotonic() > deadline:
+                time.sleep(0.1)  # what the daemon wrote last
+                if done():
+                    return
+                raise AssertionError("no %s; log:\n%s" % (what, "\n".join(self.lines())))
+            time.sleep(0.02)
+
+    def wait_for(self, fragment):
+        # Returns the first line containing fragment, or fails.
+        found = lambda: [line for line in self.lines() if fragment in line]  # noqa: E731
+        self._until(found, "line with %r" % fragment)
+        return found()[0]
 
     def http_port(self):
         return int(self.wait_for("HTTP endpoint listening on TCP port ").rsplit(" ", 1)[1])
@@ -90,22 +83,14 @@ class Daemon:
 
     def stop(self, sig=signal.SIGTERM, timeout=10.0):
         # Waits for the end of start-up, signals, and returns the exit status.
-        deadline = time.monotonic() + timeout
-        while not self.handles_sigterm():
-            if self.proc.poll() is not None or time.monotonic() > deadline:
-                raise AssertionError("daemon not ready; log:\n" + "\n".join(self.lines()))
-            time.sleep(0.02)
+        self._until(self.handles_sigterm, "end of start-up")
         self.proc.send_signal(sig)
-        try:
-            return self.proc.wait(timeout)
-        finally:
-            self._reader.join(timeout)
+        return self.proc.wait(timeout)
 
     def kill(self):
         if self.proc.poll() is None:
             self.proc.kill()
-            self.proc.wait()
-        self._reader.join(5)
+        self.proc.wait()
 
 
 class KmipServer:
