@@ -43,7 +43,6 @@ TEST_F(ProviderConfigTest, ProviderReadsBackAsWrittenWithServersInConfiguredOrde
   EXPECT_FALSE(info->keyServer.proxyServer || info->keyServer.connectionTimeout ||
                info->keyServer.kmipServer.username);
   EXPECT_TRUE(info->keyServer.kmipServer.servers.empty());
-  EXPECT_TRUE(log_.Has(6, "Config store object proxy_server not found\n"));
   Zyrd::Kms::KmsInfo client;
   ASSERT_EQ(ReadClientConfig("bare", client), kStoreOk);
   EXPECT_EQ(client.connectionTimeout, 0);  // the client's default, not -1
@@ -57,7 +56,6 @@ TEST_F(ProviderConfigTest, UpdatingAWorkingSetReplacesServersAndProxy) {
   ASSERT_EQ(DeleteAllServers(o), kStoreOk);
   ASSERT_EQ(AddServer(o, "only", "kms.new", 1), kStoreOk);
   EXPECT_EQ(AddServer(o, "only", "kms.other", 2), kStoreError);
-  EXPECT_EQ(log_.Count("Error creating server configstore object: sub-object 'servers'"), 1u);
   ASSERT_EQ(WriteProvider(o), kStoreOk);
   std::shared_ptr<Svc::Info> info;
   ASSERT_EQ(ReadProviderInfo("p1", info), kStoreOk);
@@ -86,13 +84,10 @@ TEST_F(ProviderConfigTest, ExistingProviderGives1AndMissingOnesOrPartsGive3) {
   EXPECT_EQ(ReadProviderInfo("nope", info), kStoreNotFound);
   EXPECT_EQ(ReadClientConfig("nope", client), kStoreNotFound);
   EXPECT_EQ(DeleteProvider("nope"), kStoreNotFound);
-  EXPECT_TRUE(log_.Has(2, "Provider nope not found\n"));
-  EXPECT_TRUE(log_.Has(2, "Error getting objects from config store for provider nope\n"));
   real_->WriteObject(std::make_shared<ConfigStoreObject>(
                          ConfigStoreObjectId("providers", "kms", "orna", "hollow")),
                      0);
   EXPECT_EQ(GetProviderObjects("hollow", o), kStoreNotFound);
-  EXPECT_TRUE(log_.Has(2, "Config store object key_server not found\n"));
 }
 
 TEST_F(ProviderConfigTest, StoreExceptionsGive2WithTheirLogLines) {
@@ -138,7 +133,6 @@ TEST_F(ProviderConfigTest, StoredValuesOfTheWrongTypeOrMissingGive2) {
   Tamper("p2", [](ProviderConfigObjects& o) { o.provider->DeleteValue("master_key_id"); });
   EXPECT_EQ(ReadProviderInfo("p2", info), kStoreError);
   EXPECT_EQ(ReadClientConfig("p2", client), kStoreError);
-  EXPECT_EQ(log_.Count("Error reading master_key_id from config store\n"), 2u);
 }
 
 TEST_F(ProviderConfigTest, ClientConfigurationCarriesTrustMaterialStandardised) {
@@ -173,7 +167,6 @@ TEST_F(ProviderConfigTest, ClientConfigurationCarriesTrustMaterialStandardised) 
     o.kmipServer->GetSubObject(SubObjectId("client_certificate"))->DeleteValue("private_key");
   });
   EXPECT_EQ(ReadClientConfig("p1", client), kStoreError);
-  EXPECT_TRUE(log_.Has(2, "Error reading private_key from config store\n"));
 }
 
 TEST_F(ProviderConfigTest, ListsAndHostsFollowTheStore) {

@@ -28,9 +28,6 @@ TEST_F(TrustMaterialTest, EveryOperationOnAMissingProviderGives3) {
   EXPECT_EQ(SetServerCertificates("nope", {"c"}), kStoreNotFound);
   EXPECT_EQ(a, "a");
   EXPECT_EQ(b, "b");
-  EXPECT_TRUE(log_.Has(2, "Get credential could not find kmip server for provider nope: 3\n"));
-  EXPECT_TRUE(log_.Has(2, "Set credential could not find kmip server for provider nope: 3\n"));
-  EXPECT_EQ(log_.Count("Unable to find provider or kmip server config for nope: 3\n"), 2u);
 }
 
 // Never-set material leaves the caller's output alone (a client certificate
@@ -43,11 +40,8 @@ TEST_F(TrustMaterialTest, CredentialClientCertificateAndCsrRoundTrip) {
   ASSERT_EQ(GetClientCsr("p1", csr, csrKey), kStoreOk);
   EXPECT_EQ(credential + "|" + cert + "|" + key + "|" + csr + "|" + csrKey,
             "caller's||caller's key|caller's|caller's key");
-  EXPECT_TRUE(log_.Has(6, "Getting credential for the provider p1\n"));
-  EXPECT_TRUE(log_.Has(6, "Client CSR for p1 provider not found\n"));
 
   ASSERT_EQ(SetCredential("p1", " pass word\n"), kStoreOk);
-  EXPECT_TRUE(log_.Has(6, "Setting credential for the provider p1\n"));
   ASSERT_EQ(SetClientCsr("p1", "CSR", "CSRKEY"), kStoreOk);
   ASSERT_EQ(GetClientCertificate("p1", cert, key), kStoreOk);
   EXPECT_EQ(cert, "");  // a CSR is not a client certificate
@@ -64,25 +58,21 @@ TEST_F(TrustMaterialTest, CredentialClientCertificateAndCsrRoundTrip) {
     o.kmipServer->GetSubObject(SubObjectId("client_certificate"))->DeleteValue("private_key");
   });
   EXPECT_EQ(GetClientCertificate("p1", cert, key), kStoreError);
-  EXPECT_TRUE(log_.Has(2, "Error reading private key from config store for provider p1\n"));
 }
 
 TEST_F(TrustMaterialTest, ServerCertificatesNeverSetEmptyAndListed) {
   std::vector<std::string> certs{"earlier"};
   ASSERT_EQ(GetServerCertificates("p1", certs), kStoreOk);
   EXPECT_EQ(certs, std::vector<std::string>{"earlier"});
-  EXPECT_EQ(log_.Count("certificates found in configstore"), 0u);
 
   ASSERT_EQ(SetServerCertificates("p1", {"c3", "c1", "c2"}), kStoreOk);
   ASSERT_EQ(GetServerCertificates("p1", certs), kStoreOk);
   EXPECT_EQ(certs, (std::vector<std::string>{"earlier", "c3", "c1", "c2"}));
-  EXPECT_TRUE(log_.Has(6, "3 certificates found in configstore\n"));
 
   ASSERT_EQ(SetServerCertificates("p1", {}), kStoreOk);
   certs.clear();
   ASSERT_EQ(GetServerCertificates("p1", certs), kStoreOk);
   EXPECT_TRUE(certs.empty());
-  EXPECT_TRUE(log_.Has(6, "0 certificates found in configstore\n"));
 }
 
 TEST_F(TrustMaterialTest, FailedCommitsGive2AndChangeNothing) {

@@ -112,7 +112,6 @@ TEST_F(TransportTest, CallsCarryHeadersAndBodyAndManyShareOneConnection) {
   EXPECT_EQ(calls[0].acceptLanguage, "en_US");
   EXPECT_EQ(calls[0].responseCode, 1);
   EXPECT_EQ(calls[0].peer.rfind("127.0.0.1:", 0), 0u);
-  EXPECT_EQ(log_.Count("Request received[" + calls[0].peer + "]"), 1u);
 
   for (int i = 0; i < 50; ++i) {
     std::string body = "{\"n\":" + std::to_string(i) + "}";
@@ -157,7 +156,6 @@ TEST_F(TransportTest, ExpectationsAndDeclaredBodiesOfGet) {
       "Expect: 200-ok\r\n\r\n{}");
   EXPECT_EQ(other.ReadToEnd(),
             "HTTP/1.1 417 Expectation Failed\r\nConnection: close\r\nContent-Length: 0\r\n\r\n");
-  EXPECT_TRUE(log_.Has(5, "Invalid Http request: Expect header value is not 100-continue\n"));
   EXPECT_EQ(Calls().size(), 3u);
 
   RawHttpClient get(port_);
@@ -184,8 +182,6 @@ TEST_F(TransportTest, UnsupportedContentTypesAndSizesAreRefusedFromTheHead) {
     ExpectRefusal(client, name);
   }
   EXPECT_TRUE(Calls().empty());
-  EXPECT_EQ(log_.Count("Request is considered as bad"), 3u);
-  EXPECT_EQ(log_.Count("Request is framed. Not supported"), 1u);
 }
 
 TEST_F(TransportTest, UnusableHeadsGetTheCanned400) {
@@ -202,7 +198,6 @@ TEST_F(TransportTest, UnusableHeadsGetTheCanned400) {
               "Server: LUMO-PicoHttp\r\n\r\n");
   }
   EXPECT_TRUE(Calls().empty());
-  EXPECT_EQ(log_.Count("Invalid Http request\n"), 3u);
 }
 
 TEST_F(TransportTest, ChunkedRequestBodiesAreDecodedAndLimitedWhileArriving) {

@@ -86,9 +86,6 @@ TEST_F(KmipKmsServerTest, GenerateThenDecryptRoundTripsUnderBothKeySizes) {
       EXPECT_EQ(back.key, made.key);
     }
   }
-  EXPECT_TRUE(
-      log_.Has(0, "Operation : 'GenerateKey', masterKeyId : '" + TestKey("aes256").id + "'\n"));
-  EXPECT_TRUE(log_.Has(0, "Operation : 'Decrypt'\n"));
 
   // A key wrapped on one server unwraps through another holding the same key.
   FakeKmipServer twin(ActiveTwin("aes256"));
@@ -131,7 +128,6 @@ TEST_F(KmipKmsServerTest, KeyStatesDecideWhatEachOperationMayDo) {
   FakeKmipServer twin(ActiveTwin("destroyed"));
   Op made = Generate(KmipKms(Provider(TestKey("destroyed").id, {twin.port()})));
   EXPECT_EQ(Decrypt(KmipKms(OnPyKmip("destroyed")), made.wrapped).result, MasterKeyNotFound);
-  EXPECT_TRUE(log_.Has(3, "Overriding the result to NotFound for server s1 of provider p1\n"));
   // The destroyed states themselves only a fake server reports.
   for (int state : {5, 6}) {
     FakeKmipServer fake(Kmip::KeyServer("mk", std::vector<uint8_t>(32, 7), state));
@@ -154,11 +150,9 @@ TEST_F(KmipKmsServerTest, FaultsMapToTheirResults) {
   FakeKmipServer noKey([](const std::vector<uint8_t>& request) {
     return ZyrdTest::FakeReply{Kmip::Key(Kmip::ReadRequest(request).id, {}, false)};
   });
-  log_.Clear();
   Op o = Generate(KmipKms(Provider("mk", {noKey.port()})));
   EXPECT_EQ(o.result, MasterKeyNotFound);
   EXPECT_FALSE(o.reason.empty());
-  EXPECT_EQ(log_.Count("Failed to find key in the response"), 1u);
   // Complete framing around an item of an unknown type.
   FakeKmipServer garbage([](const std::vector<uint8_t>&) {
     return ZyrdTest::FakeReply{
@@ -169,12 +163,11 @@ TEST_F(KmipKmsServerTest, FaultsMapToTheirResults) {
   const uint16_t closed = ZyrdTest::ClosedPort();
   EXPECT_EQ(Generate(KmipKms(Provider("mk", {closed}))).result, KeyServerCommunicationError);
 
-  // A text that is not a wrapped key fails before any server is asked.
-  log_.Clear();
+  // A text that is not a wrapped key fails before any server is asked (the
+  // closed port would answer otherwise).
   o = Decrypt(KmipKms(Provider("mk", {closed})), "zyrwk.v1.nope");
   EXPECT_EQ(o.result, MetadataFailure);
   EXPECT_EQ(o.reason, "Failed to read metadata");
-  EXPECT_TRUE(log_.Lines().empty());
 }
 
 TEST_F(KmipKmsServerTest, ProbeReportsTrustInBothDirectionsAndTheMasterKey) {
@@ -195,7 +188,6 @@ TEST_F(KmipKmsServerTest, ProbeReportsTrustInBothDirectionsAndTheMasterKey) {
             1u);
   EXPECT_FALSE(status.masterKeyFound);
   EXPECT_EQ(status.masterKeyErrors, std::vector<KmsResult>{MasterKeyNotFound});
-  EXPECT_TRUE(log_.Has(3, "Key server s1 of provider p1 is unhealthy\n"));
 
   // Neither side trusts the other.
   KmipKms(OnPyKmip("aes256", "other_ca", "other_client")).GetStatus(status);
@@ -219,7 +211,6 @@ TEST_F(KmipKmsServerTest, CachedStatusServesKeyOperationsWithoutAnyConnection) {
   Op made = Generate(client);
   ASSERT_EQ(made.result, Ok);
   EXPECT_EQ(Decrypt(client, made.wrapped).key, made.key);
-  EXPECT_TRUE(log_.Has(6, "Provider p1 using cached key and state\n"));
   // The cached status answers without probing, and so does the certificate.
   KmsStatus status;
   client.GetStatus(status);

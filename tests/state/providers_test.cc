@@ -80,10 +80,8 @@ TEST_F(ProvidersTest, FreshCacheReturnsTheSameClientAndUnknownProvidersChangeNot
   ASSERT_NE(a, nullptr);
   EXPECT_EQ(state_.GetProvider("p1"), a);
   EXPECT_EQ(backend_.reads, 1);
-  EXPECT_TRUE(log_.Has(5, "Added provider p1 to providers state\n"));
   EXPECT_EQ(state_.GetProvider("nope"), nullptr);
   EXPECT_EQ(state_.Size(), 1u);
-  EXPECT_TRUE(log_.Has(3, "Error getting provider nope\n"));
 }
 
 TEST_F(ProvidersTest, StaleCacheIsDroppedWholeAndRebuilt) {
@@ -95,7 +93,6 @@ TEST_F(ProvidersTest, StaleCacheIsDroppedWholeAndRebuilt) {
   clock_.AdvanceUs(1000000);
   EXPECT_NE(state_.GetProvider("p1"), p1);
   EXPECT_EQ(state_.Size(), 1u);  // p2 went with the stale cache
-  EXPECT_TRUE(log_.Has(5, "Deleted all providers from providers state\n"));
 }
 
 TEST_F(ProvidersTest, CachingOffBuildsAFreshClientEveryTime) {
@@ -112,7 +109,6 @@ TEST_F(ProvidersTest, DeleteDropsOnlyThatProvider) {
   auto p1 = state_.GetProvider("p1");
   auto p2 = state_.GetProvider("p2");
   state_.DeleteProviderFromState("p1");
-  EXPECT_TRUE(log_.Has(5, "Deleted provider p1 from providers state\n"));
   EXPECT_NE(state_.GetProvider("p1"), p1);
   EXPECT_EQ(state_.GetProvider("p2"), p2);
   // A request still holding the dropped client keeps a valid object.
@@ -126,7 +122,6 @@ TEST_F(ProvidersTest, StatusUpdateRefreshesEveryProviderAndRearms) {
   auto p1 = state_.GetProvider("p1");
   clock_.AdvanceUs(1700ull * 1000000);
   ASSERT_TRUE(scheduler_.RunNext());
-  EXPECT_TRUE(log_.Has(6, "Updating status\n"));
   ASSERT_EQ(backend_.made.size(), 2u);  // p1 existed, p2 was added
   for (const auto& client : backend_.made) EXPECT_EQ(client->updates, 1);
   clock_.AdvanceUs(1700ull * 1000000);
