@@ -1,51 +1,30 @@
-// Deterministic attestation tokens for tests: an RSA key pair made once per
+// Attestation tokens for tests and benchmarks: an RSA key pair made once per
 // process and JWTs signed with it (or with anything else a test needs).
 #pragma once
 
 #include <jwt.h>
-#include <openssl/evp.h>
-#include <openssl/pem.h>
-#include <openssl/rsa.h>
 
-#include <memory>
+#include <cstdlib>
 #include <string>
+
+#include "tests/support/test_certs.h"
 
 namespace ZyrdTest {
 
 struct KeyPair {
   std::string privatePem;
   std::string publicPem;
-
-  static KeyPair Generate() {
-    EVP_PKEY* key = EVP_RSA_gen(2048);
-    KeyPair out{Pem(key, true), Pem(key, false)};
-    EVP_PKEY_free(key);
-    return out;
-  }
-
- private:
-  static std::string Pem(EVP_PKEY* key, bool isPrivate) {
-    BIO* bio = BIO_new(BIO_s_mem());
-    if (isPrivate) {
-      PEM_write_bio_PrivateKey(bio, key, nullptr, nullptr, 0, nullptr, nullptr);
-    } else {
-      PEM_write_bio_PUBKEY(bio, key);
-    }
-    char* data = nullptr;
-    long length = BIO_get_mem_data(bio, &data);
-    std::string out(data, static_cast<size_t>(length));
-    BIO_free(bio);
-    return out;
-  }
 };
 
 // The process's vouchd key and a second, unrelated one.
 inline const KeyPair& VouchdKey() {
-  static const KeyPair key = KeyPair::Generate();
+  static const TestCert cert = MakeSelfSignedCert("vouchd");
+  static const KeyPair key{cert.privateKeyPem, cert.publicKeyPem};
   return key;
 }
 inline const KeyPair& OtherKey() {
-  static const KeyPair key = KeyPair::Generate();
+  static const TestCert cert = MakeSelfSignedCert("other");
+  static const KeyPair key{cert.privateKeyPem, cert.publicKeyPem};
   return key;
 }
 
@@ -63,12 +42,10 @@ class TokenBuilder {
     return b;
   }
 
+  // Sets a string claim; an empty value removes it.
   TokenBuilder& Claim(const char* name, const char* value) {
-    jwt_add_grant(jwt_, name, value);
-    return *this;
-  }
-  TokenBuilder& Remove(const char* name) {
     jwt_del_grants(jwt_, name);
+    if (*value != '\0') jwt_add_grant(jwt_, name, value);
     return *this;
   }
   TokenBuilder& Exp(long value) {

@@ -22,26 +22,6 @@ TEST(AuditTest, RecordIsOneJsonLineWithTheFixedMembersFirst) {
                   "\n");
 }
 
-class Sink : public Tsl::Audit::AuditSink {
- public:
-  bool Write(std::string_view line) override {
-    lines.emplace_back(line);
-    return true;
-  }
-  std::vector<std::string> lines;
-};
-
-TEST(AuditTest, EachRecordIsOneWriteToTheSink) {
-  Sink sink;
-  Tsl::Audit::SetAuditSink(&sink);
-  TslAudit_Attr none[] = {{nullptr, nullptr}};
-  EXPECT_TRUE(TslAudit_LogList("api.call", "", "", false, none));
-  EXPECT_TRUE(TslAudit_LogList("api.call", "root", "a:b", true, none));
-  Tsl::Audit::SetAuditSink(nullptr);
-  ASSERT_EQ(sink.lines.size(), 2u);
-  EXPECT_NE(sink.lines[0].find(R"("subject":"","object":"","success":false})"), std::string::npos);
-}
-
 TEST(AuditTest, FileSinkAppendsToAPrivateAuditLogUnderTheRoot) {
   ZyrdTest::TempDir root;
   setenv("ZYRD_ROOT", root.Path().c_str(), 1);

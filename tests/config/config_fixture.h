@@ -72,7 +72,7 @@ class ThrowingStore : public ConfigStore {
 class ConfigTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    real_ = SqliteConfigStore::Open(dir_.File("configstore.db"));
+    real_ = SqliteConfigStore::Open(dir_ / "configstore.db");
     store_ = std::make_shared<ThrowingStore>(real_);
     ConfigStore::SetGlobalStore(store_);
     Zyrd::ZyrApi::GetDaemonLogger()->SetLevel(5);
@@ -85,18 +85,14 @@ class ConfigTest : public ::testing::Test {
     using namespace Zyrd::Config;
     ProviderConfigObjects o;
     o.name = name;
-    ASSERT_EQ(CreateProviderObjects(o), 0);
-    ASSERT_EQ(SetMasterKeyId(o, "mk-" + name), 0);
-    ASSERT_EQ(SetDescription(o, "desc"), 0);
-    ASSERT_EQ(SetConnectionTimeout(o, 30), 0);
-    if (withProxy) {
-      ASSERT_EQ(SetProxy(o, "proxy.example", 3128), 0);
+    // Evaluated in order, as written.
+    for (int status :
+         {CreateProviderObjects(o), SetMasterKeyId(o, "mk-" + name), SetDescription(o, "desc"),
+          SetConnectionTimeout(o, 30), withProxy ? SetProxy(o, "proxy.example", 3128) : 0,
+          SetType(o, "KMIP"), SetUserName(o, "alice"), AddServer(o, "s2", "kms2.example", 5696),
+          AddServer(o, "s1", "kms1.example", 5697), WriteProvider(o)}) {
+      ASSERT_EQ(status, 0);
     }
-    ASSERT_EQ(SetType(o, "KMIP"), 0);
-    ASSERT_EQ(SetUserName(o, "alice"), 0);
-    ASSERT_EQ(AddServer(o, "s2", "kms2.example", 5696), 0);
-    ASSERT_EQ(AddServer(o, "s1", "kms1.example", 5697), 0);
-    ASSERT_EQ(WriteProvider(o), 0);
   }
 
   // Changes the stored provider directly in the store.

@@ -69,7 +69,7 @@ namespace {
 
 TEST(CrashSafety, KilledWriterKeepsEveryReturnedWriteAndNothingTorn) {
   TempDir dir;
-  const std::string path = dir.File("zyrd/configstore.db");
+  const std::string path = dir / "zyrd/configstore.db";
   std::mt19937 rng(std::random_device{}());
   uint32_t acked = 0;  // writes that returned, over all rounds
 

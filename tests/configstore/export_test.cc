@@ -44,7 +44,7 @@ TEST_F(ExportTest, EqualContentsGiveEqualTextsAndImportGivesTheTextBack) {
   EXPECT_LT(text.find(R"("instance":"zeta")"), text.find(R"("instance":"alpha")"));  // stored order
 
   TempDir otherDir;
-  auto other = SqliteConfigStore::Open(otherDir.File("c.db"));
+  auto other = SqliteConfigStore::Open(otherDir / "c.db");
   other->WriteObject(SampleProvider("p1"), 0);  // written in another order
   other->WriteObject(SampleProvider("p2", 7), 0);
   EXPECT_EQ(other->Export({ProvidersFilter()}), text);

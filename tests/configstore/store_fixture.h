@@ -46,7 +46,7 @@ inline ConfigStoreObjectPtr SampleProvider(const std::string& name, long generat
 
 class StoreTest : public ::testing::Test {
  protected:
-  std::string DbPath() const { return dir_.File("lib/zyrd/configstore.db"); }
+  std::string DbPath() const { return dir_ / "lib/zyrd/configstore.db"; }
   SqliteConfigStore& Store() {
     if (!store_) store_ = SqliteConfigStore::Open(DbPath());
     return *store_;

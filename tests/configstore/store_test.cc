@@ -1,5 +1,6 @@
 #include <sys/stat.h>
 
+#include <fstream>
 #include <thread>
 
 #include "tests/configstore/store_fixture.h"
@@ -58,7 +59,7 @@ TEST_F(StoreTest, DatabaseIsPrivateAndSharedBetweenConcurrentConnections) {
   struct stat st;
   ASSERT_EQ(stat(DbPath().c_str(), &st), 0);
   EXPECT_EQ(st.st_mode & 0777, 0600u);
-  ASSERT_EQ(stat(dir_.File("lib/zyrd").c_str(), &st), 0);
+  ASSERT_EQ(stat((dir_ / "lib/zyrd").c_str(), &st), 0);
   EXPECT_EQ(st.st_mode & 0777, 0700u);
 
   // Two connections (as the daemon and cfgvault) write at once; the busy
@@ -79,10 +80,8 @@ TEST_F(StoreTest, DatabaseIsPrivateAndSharedBetweenConcurrentConnections) {
 TEST_F(StoreTest, OpeningSomethingElseFailsClearly) {
   EXPECT_THROW(SqliteConfigStore::Open(""), ConfigStoreException);
   EXPECT_THROW(SqliteConfigStore::Open(dir_.Path()), ConfigStoreException);  // a directory
-  FILE* f = fopen(dir_.File("text.db").c_str(), "w");
-  fputs("this is not a database, just text that is long enough to fill a header page", f);
-  fclose(f);
-  EXPECT_THROW(SqliteConfigStore::Open(dir_.File("text.db")), ConfigStoreException);
+  std::ofstream(dir_ / "text.db") << "not a database, just text long enough to fill a header page";
+  EXPECT_THROW(SqliteConfigStore::Open(dir_ / "text.db"), ConfigStoreException);
 }
 
 }  // namespace

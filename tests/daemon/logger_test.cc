@@ -26,19 +26,20 @@ void RecordingLog(int level, const char* fmt, ...) {
   gCalls.push_back({level, fmt, buf});
 }
 
-TEST(LumoLoggerWrapper, MapsFrameworkLevels) {
+TEST(LumoLoggerWrapper, OneCallPerRecordAtTheMappedLevel) {
   const int expected[] = {7, 6, 5, 3, 2, 1};
   for (int level = 0; level <= 5; ++level) {
     EXPECT_EQ(Zyrd::ZyrApi::MapFrameworkLevel(level), expected[level]);
   }
-}
-
-TEST(LumoLoggerWrapper, OneCallPerRecordWithTheTextAsCollected) {
   ZyrdTest::LogCapture threshold(7);
   gCalls.clear();
   LumoLoggerWrapper wrapper(&RecordingLog);
-  LUMO_LOG(&wrapper, Lumo::Log::kInfo) << "Listening on: " << "127.0.0.1:7888";
-  LUMO_LOG(&wrapper, Lumo::Log::kDebug) << "Request received" << "[" << "1.2.3.4" << "]\n";
+  LUMO_LOG(&wrapper, Lumo::Log::kInfo) << "Listening on: "
+                                       << "127.0.0.1:7888";
+  LUMO_LOG(&wrapper, Lumo::Log::kDebug) << "Request received"
+                                        << "["
+                                        << "1.2.3.4"
+                                        << "]\n";
   ASSERT_EQ(gCalls.size(), 2u);
   EXPECT_EQ(gCalls[0].level, 5);
   EXPECT_EQ(gCalls[0].format, "%s");
@@ -66,21 +67,6 @@ TEST(LumoLoggerWrapper, DisabledLevelBuildsNoRecordAndEvaluatesNothing) {
 TEST(LumoLoggerWrapperDeathTest, LevelAboveFiveIsNotReached) {
   LumoLoggerWrapper wrapper(&RecordingLog);
   EXPECT_DEATH(wrapper.CreateRecord(6), "NOT_REACHED daemon/logger:[0-9]+");
-}
-
-TEST(DaemonLogger, IsCreatedOnceAndReportsExceptionsAtWarning) {
-  auto a = Zyrd::ZyrApi::GetDaemonLogger();
-  EXPECT_EQ(a, Zyrd::ZyrApi::GetDaemonLogger());
-  EXPECT_EQ(a->Name(), "zyrdLogger");
-
-  ZyrdTest::LogCapture capture(7);
-  a->SetLevel(5);
-  Zyrd::ZyrApi::LogToDaemonLogger("disk full");
-  EXPECT_TRUE(capture.Has(3, "zyrdLogger: disk full\n"));
-  a->SetLevel(2);
-  capture.Clear();
-  Zyrd::ZyrApi::LogToDaemonLogger("ignored");
-  EXPECT_TRUE(capture.Lines().empty());
 }
 
 }  // namespace

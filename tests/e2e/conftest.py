@@ -1,23 +1,21 @@
-import sys
 import pathlib
+import sys
 
 import pytest
 
 sys.path.insert(0, str(pathlib.Path(__file__).parent))
 
-from daemon_process import Daemon  # noqa: E402
-from kmip_server import KmipServer  # noqa: E402
+from harness import Daemon, KmipServer  # noqa: E402
 
 
 @pytest.fixture
 def start_daemon():
-    """Starts daemons under given roots; kills whatever is left at the end."""
+    # Starts daemons under given roots; kills whatever is left at the end.
     started = []
 
-    def start(root, env=None, metadata=True):
-        d = Daemon(root, env, metadata)
-        started.append(d)
-        return d
+    def start(root, env=None):
+        started.append(Daemon(root, env))
+        return started[-1]
 
     yield start
     for d in started:
@@ -26,8 +24,7 @@ def start_daemon():
 
 @pytest.fixture(scope="module")
 def kmip_server(tmp_path_factory):
-    """A started PyKMIP server shared by the tests of one module."""
-    server = KmipServer(tmp_path_factory.mktemp("kmip"))
-    server.start()
+    # A started PyKMIP server shared by the tests of one module.
+    server = KmipServer(tmp_path_factory.mktemp("kmip")).start()
     yield server
     server.stop()

@@ -1,12 +1,15 @@
-"""The store's command-line tool, and the daemon's restore of a seeded store."""
+# The store's command-line tool, and the daemon's restore of a seeded store.
 
 import json
 import os
 import subprocess
 
-from daemon_process import BUILD_DIR, write_config
+from harness import BUILD_DIR, write_config
 
-CFGVAULT = str(BUILD_DIR / "cfgvault")
+
+def server(name, host):
+    return {"name": "servers", "instance": name, "values": {"hostname": host, "port": 5696}}
+
 
 PROVIDER = {
     "key": "providers", "group": "kms", "component": "orna", "instance": "p1",
@@ -14,67 +17,57 @@ PROVIDER = {
     "subObjects": [{
         "name": "key_server", "instance": "",
         "values": {"type": "KMIP", "connection_timeout": 30, "server_cert": ["c1", "c2"]},
-        "subObjects": [{
-            "name": "kmip_server", "instance": "", "values": {"username": "u"},
-            "subObjects": [
-                {"name": "servers", "instance": "s2", "values": {"hostname": "b", "port": 5696}},
-                {"name": "servers", "instance": "s1", "values": {"hostname": "a", "port": 5696}},
-            ],
-        }],
+        "subObjects": [{"name": "kmip_server", "instance": "", "values": {"username": "u"},
+                        "subObjects": [server("s2", "b"), server("s1", "a")]}],
     }],
 }
 
 
-def cfgvault(db, *args, stdin=None):
-    return subprocess.run([CFGVAULT, "--db", str(db), *args], input=stdin,
-                          capture_output=True, timeout=30)
+def export_text(*objects):
+    return json.dumps({"format": "orna-configstore-export", "version": 1,
+                       "objects": list(objects)}).encode()
 
 
-def seed(db, *objects):
-    text = json.dumps({"format": "orna-configstore-export", "version": 1,
-                       "objects": list(objects)})
-    result = cfgvault(db, "import", "-", stdin=text.encode())
-    assert result.returncode == 0, result.stderr
+def cfgvault(db, *args, stdin=None, env=None):
+    return subprocess.run([str(BUILD_DIR / "cfgvault"), *(["--db", str(db)] if db else []), *args],
+                          input=stdin, capture_output=True, timeout=30, env=env)
+
+
+def export(db):
+    return cfgvault(db, "export", "providers", "kms", "orna")
 
 
 def test_export_after_import_gives_the_text_back_byte_for_byte(tmp_path):
     db = tmp_path / "store" / "configstore.db"
-    seed(db, PROVIDER)
-    first = cfgvault(db, "export", "providers", "kms", "orna")
+    assert cfgvault(db, "import", "-", stdin=export_text(PROVIDER)).returncode == 0
+    first = export(db)
     assert first.returncode == 0, first.stderr
-    exported = tmp_path / "export.json"
-    exported.write_bytes(first.stdout)
-
-    other = tmp_path / "other.db"
-    assert cfgvault(other, "import", str(exported)).returncode == 0
-    second = cfgvault(other, "export", "providers", "kms", "orna")
-    assert second.stdout == first.stdout
-    assert json.loads(first.stdout)["objects"][0]["subObjects"][0]["subObjects"][0][
-        "subObjects"][0]["instance"] == "s2"  # server order kept
-
-    assert os.stat(db).st_mode & 0o777 == 0o600
-    assert os.stat(db.parent).st_mode & 0o777 == 0o700
+    (tmp_path / "export.json").write_bytes(first.stdout)
+    assert cfgvault(tmp_path / "other.db", "import", str(tmp_path / "export.json")).returncode == 0
+    assert export(tmp_path / "other.db").stdout == first.stdout
+    servers = json.loads(first.stdout)["objects"][0]["subObjects"][0]["subObjects"][0]
+    assert [s["instance"] for s in servers["subObjects"]] == ["s2", "s1"]  # order kept
 
 
 def test_malformed_import_exits_non_zero_and_changes_nothing(tmp_path):
     db = tmp_path / "configstore.db"
-    seed(db, PROVIDER)
-    before = cfgvault(db, "export", "providers", "kms", "orna").stdout
+    cfgvault(db, "import", "-", stdin=export_text(PROVIDER))
+    before = export(db).stdout
     for text in [b"", b"{", b'{"format":"orna-configstore-export","version":9,"objects":[]}',
-                 b'{"format":"orna-configstore-export","version":1,"objects":[{"key":"providers",'
-                 b'"group":"kms","component":"orna","instance":"p1","values":{"port":1.5}}]}']:
+                 export_text(dict(PROVIDER, values={"port": 1.5}))]:
         result = cfgvault(db, "import", "-", stdin=text)
         assert result.returncode == 1
         assert result.stderr.decode().startswith("cfgvault: import refused: ")
         assert result.stderr.count(b"\n") == 1
     missing = cfgvault(db, "import", str(tmp_path / "absent.json"))
     assert missing.returncode == 1 and b"cannot read" in missing.stderr
-    assert cfgvault(db, "export", "providers", "kms", "orna").stdout == before
+    assert export(db).stdout == before
 
 
 def test_list_get_delete_and_usage(tmp_path):
     db = tmp_path / "configstore.db"
-    seed(db, PROVIDER, dict(PROVIDER, instance="p0", values={"master_key_id": "k0"}))
+    other = dict(PROVIDER, instance="p0", values={"master_key_id": "k0"})
+    cfgvault(db, "import", "-", stdin=export_text(PROVIDER, other))
     assert cfgvault(db, "list", "providers", "kms", "orna").stdout == b"p0\np1\n"
     got = cfgvault(db, "get", "providers", "kms", "orna", "p1")
     assert json.loads(got.stdout)["values"]["master_key_id"] == "k1"
@@ -87,20 +80,15 @@ def test_list_get_delete_and_usage(tmp_path):
 
 
 def test_default_database_is_the_daemons_and_start_up_restores_it(tmp_path, start_daemon):
-    env = dict(os.environ, ZYRD_ROOT=str(tmp_path))
-    text = json.dumps({"format": "orna-configstore-export", "version": 1,
-                       "objects": [PROVIDER]})
-    result = subprocess.run([CFGVAULT, "import", "-"], input=text.encode(), env=env,
-                            capture_output=True, timeout=30)
+    result = cfgvault(None, "import", "-", stdin=export_text(PROVIDER),
+                      env=dict(os.environ, ZYRD_ROOT=str(tmp_path)))
     assert result.returncode == 0, result.stderr
     assert (tmp_path / "var/lib/zyrd/configstore.db").exists()
-
     write_config(tmp_path, "")
     d = start_daemon(tmp_path)
     d.wait_for("Restoring configuration key providers instance p1")
-    d.wait_for("Restoring configuration key zyrd_config")
+    d.wait_for("Stats logging interval")
     assert d.stop() == 0
     lines = d.lines()
     restore = next(i for i, l in enumerate(lines) if "Restoring configuration key zyrd_config" in l)
-    stats = next(i for i, l in enumerate(lines) if "Stats logging interval" in l)
-    assert restore < stats
+    assert restore < next(i for i, l in enumerate(lines) if "Stats logging interval" in l)

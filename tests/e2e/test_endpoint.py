@@ -1,22 +1,11 @@
-"""The daemon's HTTP endpoint on the loopback addresses."""
+# The daemon's HTTP endpoint on the loopback addresses.
 
 import json
 import socket
 
 import pytest
 
-from daemon_process import write_config
-
-
-def exchange(port, request):
-    """Sends one request to 127.0.0.1 and returns everything the daemon sends
-    back until it closes the connection."""
-    with socket.create_connection(("127.0.0.1", port), timeout=10) as s:
-        s.sendall(request)
-        data = b""
-        while chunk := s.recv(65536):
-            data += chunk
-        return data
+from harness import write_config
 
 
 def test_second_daemon_on_the_same_port_exits_with_status_one(tmp_path, start_daemon):
@@ -43,8 +32,10 @@ def test_without_ipv6_the_daemon_serves_on_ipv4_alone(tmp_path, start_daemon):
         d = start_daemon(tmp_path, {"ZYRD_HTTP_PORT": str(port)})
         assert d.http_port() == port
         d.wait_for("IPv6 Failed to listen on: [::1]:%d" % port)
-        reply = exchange(port, b"POST /api HTTP/1.1\r\nContent-Type: application/json\r\n"
-                               b"Connection: close\r\nContent-Length: 2\r\n\r\n{}")
+        with socket.create_connection(("127.0.0.1", port), timeout=10) as s:
+            s.sendall(b"POST /api HTTP/1.1\r\nContent-Type: application/json\r\n"
+                      b"Connection: close\r\nContent-Length: 2\r\n\r\n{}")
+            reply = b"".join(iter(lambda: s.recv(65536), b""))
         head, body = reply.split(b"\r\n\r\n", 1)
         assert head.startswith(b"HTTP/1.1 200 OK\r\n")
         assert json.loads(body)["jsonrpc"] == "2.0"

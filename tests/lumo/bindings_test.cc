@@ -35,11 +35,12 @@ Outer tag_invoke(boost::json::value_to_tag<Outer>, const boost::json::value& v) 
   return out;
 }
 
-// Decodes `json` through a bound operation; returns the invalid-params detail,
-// or "ok" when the operation ran.
-std::string Decode(const char* json, Outer* decoded = nullptr) {
-  auto op = Lumo::Provider::BindOperation<Outer, int64_t>(
-      "op", [&](Outer in, Lumo::AsyncResult<int64_t> result, const Lumo::Core::AsyncActivation&) {
+// Decodes `json` through an operation bound with input `In`; returns the
+// invalid-params detail, or "ok" when the operation ran.
+template <typename In = Outer>
+std::string Decode(const char* json, In* decoded = nullptr) {
+  auto op = Lumo::Provider::BindOperation<In, int64_t>(
+      "op", [&](In in, Lumo::AsyncResult<int64_t> result, const Lumo::Core::AsyncActivation&) {
         if (decoded) *decoded = in;
         result.SetResult(1);
       });
@@ -80,14 +81,8 @@ TEST(BindingsTest, BadInputsNameTheFieldAndNeverReachTheOperation) {
 }
 
 TEST(BindingsTest, OperationWithoutInputsRefusesAnyField) {
-  auto op = Lumo::Provider::BindOperation<Lumo::Bindings::NoInput, int64_t>(
-      "get", [](auto, Lumo::AsyncResult<int64_t> r, const auto&) { r.SetResult(1); });
-  for (const char* json : {"{}", R"({"x":1})"}) {
-    auto call = std::make_shared<Lumo::Core::Call>("svc.get", boost::json::parse(json));
-    MethodResult got;
-    op.invoke(call, Lumo::Core::Completion(call, [&](MethodResult r) { got = std::move(r); }));
-    EXPECT_EQ(got.kind == MethodResult::Kind::kInvalidParams, std::string(json) != "{}");
-  }
+  EXPECT_EQ(Decode<Lumo::Bindings::NoInput>("{}"), "ok");
+  EXPECT_NE(Decode<Lumo::Bindings::NoInput>(R"({"x":1})"), "ok");
 }
 
 }  // namespace

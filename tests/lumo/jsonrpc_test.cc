@@ -73,19 +73,20 @@ TEST_F(JsonRpcTest, ServiceErrorsCarryTheirNameInTheBodyAndTheHeader) {
 }
 
 TEST_F(JsonRpcTest, MalformedRequestsGetTheJsonRpcErrorCodes) {
-  auto code = [&](const std::string& body) {
-    auto v = boost::json::parse(Send(body).body);
-    return v.at("error").at("code").as_int64();
+  const std::pair<const char*, int> cases[] = {
+      {"{not json", -32700},
+      {"", -32700},
+      {"[]", -32600},
+      {R"({"id":1,"method":"ok.op"})", -32600},
+      {R"({"jsonrpc":"1.0","id":1,"method":"ok.op"})", -32600},
+      {R"({"jsonrpc":"2.0","id":1,"method":""})", -32600},
+      {R"({"jsonrpc":"2.0","id":{},"method":"ok.op"})", -32600},
+      {R"({"jsonrpc":"2.0","id":1,"method":"ok.op","extra":1})", -32600},
+      {R"({"jsonrpc":"2.0","id":1,"method":"ok.op","params":[1]})", -32602},
   };
-  EXPECT_EQ(code("{not json"), -32700);
-  EXPECT_EQ(code(""), -32700);
-  EXPECT_EQ(code("[]"), -32600);
-  EXPECT_EQ(code(R"({"id":1,"method":"ok.op"})"), -32600);
-  EXPECT_EQ(code(R"({"jsonrpc":"1.0","id":1,"method":"ok.op"})"), -32600);
-  EXPECT_EQ(code(R"({"jsonrpc":"2.0","id":1,"method":""})"), -32600);
-  EXPECT_EQ(code(R"({"jsonrpc":"2.0","id":{},"method":"ok.op"})"), -32600);
-  EXPECT_EQ(code(R"({"jsonrpc":"2.0","id":1,"method":"ok.op","extra":1})"), -32600);
-  EXPECT_EQ(code(R"({"jsonrpc":"2.0","id":1,"method":"ok.op","params":[1]})"), -32602);
+  for (auto [body, code] : cases) {
+    EXPECT_EQ(boost::json::parse(Send(body).body).at("error").at("code").as_int64(), code) << body;
+  }
   auto r = Send(R"({"jsonrpc":"2.0","id":3,"method":"bad.op","params":{}})");
   EXPECT_EQ(
       r.body,

@@ -1,36 +1,18 @@
 #include "platform/runtime/config.h"
 
 #include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
-#include <cstdlib>
 #include <fstream>
 
 #include "daemon/settings.h"
 #include "platform/runtime/app.h"
 #include "platform/util/feature_state.h"
 #include "platform/util/log.h"
+#include "tests/support/temp_dir.h"
 
 namespace {
 
 using Strake::Service::Config;
-
-class TempFile {
- public:
-  explicit TempFile(const std::string& content) {
-    char name[] = "/tmp/zyrd-config-XXXXXX";
-    int fd = mkstemp(name);
-    close(fd);
-    path_ = name;
-    std::ofstream(path_) << content;
-  }
-  ~TempFile() { unlink(path_.c_str()); }
-  const std::string& Path() const { return path_; }
-
- private:
-  std::string path_;
-};
 
 std::shared_ptr<Config> Defaults() {
   auto config = Strake::Service::CreateScratchConfig();
@@ -38,8 +20,9 @@ std::shared_ptr<Config> Defaults() {
   return config;
 }
 
-TEST(Config, DefaultsAreTheSixSettings) {
+TEST(Config, TheSixDefaultsAndAFileThatOverridesOnlyWhatItNames) {
   auto config = Defaults();
+  config->MergeXmlText("<config/>");
   EXPECT_EQ(config->GetString("log/level", ""), "info");
   EXPECT_TRUE(config->GetBool("caching", false));
   EXPECT_EQ(config->GetInt("statusUpdateIntervalSeconds", 0), 300);
@@ -47,11 +30,7 @@ TEST(Config, DefaultsAreTheSixSettings) {
   EXPECT_EQ(config->GetInt("strake/threadPool/ioThreads", 0), 1);
   EXPECT_EQ(config->GetInt("strake/threadPool/maxThreads", 0), 10);
   EXPECT_FALSE(config->Has("statsLogIntervalSeconds"));
-  EXPECT_EQ(config->GetInt("statsLogIntervalSeconds", 0), 0);
-}
 
-TEST(Config, FileOverridesOnlyTheKeysItNames) {
-  auto config = Defaults();
   config->MergeXmlText(
       "<?xml version=\"1.0\"?>\n<config>\n  <log><level>verbose</level></log>\n"
       "  <caching>false</caching>\n  <!-- comment -->\n"
@@ -65,14 +44,7 @@ TEST(Config, FileOverridesOnlyTheKeysItNames) {
   EXPECT_EQ(config->GetInt("statsLogIntervalSeconds", 0), 900);
 }
 
-TEST(Config, EmptyConfigElementKeepsEveryDefault) {
-  auto config = Defaults();
-  config->MergeXmlText("<config/>");
-  EXPECT_EQ(config->GetInt("statusUpdateIntervalSeconds", 0), 300);
-  EXPECT_EQ(config->GetString("log/level", ""), "info");
-}
-
-TEST(Config, UnusableTextThrowsAndChangesNothing) {
+TEST(Config, UnusableTextThrowsAndChangesNothingAndBadValuesFallBack) {
   auto config = Defaults();
   for (const char* bad : {"<config><caching>false</caching>", "not xml at all",
                           "<settings><caching>false</caching></settings>",
@@ -80,38 +52,33 @@ TEST(Config, UnusableTextThrowsAndChangesNothing) {
     EXPECT_THROW(config->MergeXmlText(bad), std::runtime_error) << bad;
     EXPECT_TRUE(config->GetBool("caching", false)) << bad;
   }
-}
-
-TEST(Config, TypedReadsFallBackOnBadValues) {
-  Config config;
-  config.SetString("n", "12x");
-  config.SetString("b", "maybe");
-  config.SetString("neg", "-5");
-  EXPECT_EQ(config.GetInt("n", 7), 7);
-  EXPECT_TRUE(config.GetBool("b", true));
-  EXPECT_EQ(config.GetInt("neg", 0), -5);
-  config.SetString("b", "TRUE");
-  EXPECT_TRUE(config.GetBool("b", false));
+  config->SetString("n", "12x");
+  config->SetString("b", "maybe");
+  config->SetString("neg", "-5");
+  config->SetString("yes", "TRUE");
+  EXPECT_EQ(config->GetInt("n", 7), 7);
+  EXPECT_TRUE(config->GetBool("b", true));
+  EXPECT_EQ(config->GetInt("neg", 0), -5);
+  EXPECT_TRUE(config->GetBool("yes", false));
 }
 
 TEST(InitApp, UnreadableFileLeavesDefaultsInForceAndStillInstallsTheApp) {
-  auto config = Defaults();
-  EXPECT_THROW(Strake::Service::InitApp(config, "/nonexistent/zyrd/config.xml"),
+  EXPECT_THROW(Strake::Service::InitApp(Defaults(), "/nonexistent/zyrd/config.xml"),
                std::runtime_error);
-  auto* app = Strake::Service::GetApp();
-  ASSERT_NE(app, nullptr);
-  EXPECT_EQ(app->GetConfig().GetInt("cacheStaleTimeoutSeconds", 0), 1800);
+  ASSERT_NE(Strake::Service::GetApp(), nullptr);
+  EXPECT_EQ(Strake::Service::GetApp()->GetConfig().GetInt("cacheStaleTimeoutSeconds", 0), 1800);
   EXPECT_EQ(Groundwork::GetLogThreshold(), 5);
 }
 
 TEST(InitApp, AppliesLogLevelAndFeatureSwitches) {
-  TempFile file(
-      "<config><log><level>error</level></log>"
-      "<features><credentialGet>true</credentialGet></features></config>");
+  ZyrdTest::TempDir dir;
+  std::ofstream(dir / "config.xml") << "<config><log><level>error</level></log>"
+                                       "<features><credentialGet>true</credentialGet></features>"
+                                       "</config>";
   int saved = Groundwork::GetLogThreshold();
   FeatureState_Init();
   EXPECT_EQ(*FeatureList[kFeatureCredentialGet], 0);
-  Strake::Service::InitApp(Defaults(), file.Path());
+  Strake::Service::InitApp(Defaults(), dir / "config.xml");
   EXPECT_EQ(Groundwork::GetLogThreshold(), 2);
   EXPECT_EQ(*FeatureList[kFeatureCredentialGet], 1);
   Groundwork::SetLogThreshold(saved);

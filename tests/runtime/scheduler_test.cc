@@ -5,9 +5,6 @@
 #include <atomic>
 #include <future>
 
-#include "platform/runtime/app.h"
-#include "platform/runtime/thread_pool.h"
-
 namespace {
 
 using namespace std::chrono_literals;
@@ -39,56 +36,6 @@ TEST(AsioScheduler, CancelledItemNeverRuns) {
   scheduler.Schedule(100ms, [&] { later.set_value(); });
   ASSERT_EQ(later.get_future().wait_for(5s), std::future_status::ready);
   EXPECT_FALSE(ran.load());
-}
-
-TEST(ThreadPool, LongRunningTasksEachGetAThread) {
-  Strake::Service::ThreadPool pool(5, "t-");
-  std::atomic<int> started{0};
-  std::promise<void> release;
-  auto gate = release.get_future().share();
-  for (int i = 0; i < 5; ++i) {
-    pool.Enqueue([&, gate] {
-      ++started;
-      gate.wait();
-    });
-  }
-  for (int i = 0; i < 500 && started.load() < 5; ++i) std::this_thread::sleep_for(2ms);
-  EXPECT_EQ(started.load(), 5);
-  release.set_value();
-}
-
-TEST(ThreadPool, TasksQueuedFasterThanIdleThreadsWakeStillEachGetAThread) {
-  Strake::Service::ThreadPool pool(4, "t-");
-  std::promise<void> release;
-  auto gate = release.get_future().share();
-  std::atomic<int> started{0};
-  // One thread exists and goes idle; then three long tasks arrive at once.
-  pool.Enqueue([&] { ++started; });
-  for (int i = 0; i < 500 && started.load() < 1; ++i) std::this_thread::sleep_for(2ms);
-  std::this_thread::sleep_for(10ms);
-  for (int i = 0; i < 3; ++i) {
-    pool.Enqueue([&, gate] {
-      ++started;
-      gate.wait();
-    });
-  }
-  for (int i = 0; i < 500 && started.load() < 4; ++i) std::this_thread::sleep_for(2ms);
-  EXPECT_EQ(started.load(), 4);
-  release.set_value();
-}
-
-TEST(App, RunBlocksUntilStop) {
-  Strake::Service::App app(Strake::Service::CreateScratchConfig());
-  std::atomic<bool> returned{false};
-  std::thread runner([&] {
-    app.Run();
-    returned = true;
-  });
-  std::this_thread::sleep_for(20ms);
-  EXPECT_FALSE(returned.load());
-  app.Stop();
-  runner.join();
-  EXPECT_TRUE(returned.load());
 }
 
 }  // namespace

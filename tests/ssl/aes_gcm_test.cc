@@ -21,34 +21,29 @@ Sealed Seal(const std::vector<uint8_t>& pt, const std::vector<uint8_t>& key) {
   return s;
 }
 
-TEST(AesGcm, RoundTripsUnderBothKeySizes) {
+// Every encryption has a fresh IV; other key lengths fail with empty outputs.
+TEST(AesGcm, RoundTripsUnderBothKeySizesOnly) {
+  std::set<std::vector<uint8_t>> ivs;
   for (size_t keyLen : {16u, 32u}) {
     for (size_t ptLen : {0u, 1u, 16u, 32u, 1000u}) {
       std::vector<uint8_t> pt(ptLen, 0x5a);
-      auto key = Key(keyLen);
-      Sealed s = Seal(pt, key);
+      Sealed s = Seal(pt, Key(keyLen));
       EXPECT_EQ(s.iv.size(), 12u);
       EXPECT_EQ(s.tag.size(), 16u);
       EXPECT_EQ(s.ct.size(), ptLen);
+      ivs.insert(s.iv);
       Groundwork::SecureBytes back;
-      ASSERT_TRUE(AesGcmDecrypt(s.ct, key, s.iv, {}, s.tag, back)) << keyLen << "/" << ptLen;
+      ASSERT_TRUE(AesGcmDecrypt(s.ct, Key(keyLen), s.iv, {}, s.tag, back))
+          << keyLen << "/" << ptLen;
       EXPECT_EQ(std::vector<uint8_t>(back.begin(), back.end()), pt);
     }
   }
-}
-
-TEST(AesGcm, OtherKeyLengthsFail) {
+  EXPECT_EQ(ivs.size(), 10u);
   std::vector<uint8_t> iv{1}, ct{1}, tag{1};
   for (size_t keyLen : {0u, 15u, 24u, 33u}) {
     EXPECT_FALSE(AesGcmEncrypt(std::vector<uint8_t>(4), Key(keyLen), {}, iv, ct, tag)) << keyLen;
     EXPECT_TRUE(iv.empty() && ct.empty() && tag.empty());
   }
-}
-
-TEST(AesGcm, EveryEncryptionUsesAFreshIv) {
-  std::set<std::vector<uint8_t>> ivs;
-  for (int i = 0; i < 64; ++i) ivs.insert(Seal({1, 2, 3}, Key(32)).iv);
-  EXPECT_EQ(ivs.size(), 64u);
 }
 
 TEST(AesGcm, AnyChangedBitFailsAuthentication) {

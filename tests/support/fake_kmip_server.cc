@@ -3,14 +3,14 @@
 
 #include "platform/kmip/ossl.h"
 #include "platform/kmip/ttlv.h"
+#include "tests/support/kmip_env.h"
 #include "tests/support/loopback_server.h"
 
 namespace ZyrdTest {
 
-FakeKmipServer::FakeKmipServer(const std::string& cert_pem, const std::string& key_pem,
-                               Handler handler, Mode mode, bool ipv6)
-    : cert_pem_(cert_pem),
-      key_pem_(key_pem),
+FakeKmipServer::FakeKmipServer(Handler handler, const std::string& pkiName, Mode mode, bool ipv6)
+    : cert_pem_(PkiPem(pkiName)),
+      key_pem_(PkiKey(pkiName)),
       mode_(mode),
       handler_(std::move(handler)),
       server_([this](int fd) { Serve(fd); }, ipv6) {}

@@ -65,23 +65,17 @@ std::vector<uint8_t> Versions(const std::vector<std::pair<int, int>>& versions) 
   });
 }
 
-std::vector<uint8_t> Key(const std::string& id, const std::vector<uint8_t>& key) {
+std::vector<uint8_t> Key(const std::string& id, const std::vector<uint8_t>& key,
+                         bool withMaterial) {
   return Success(Operation::kGet, [&](Writer& w) {
     KeyBlockStart(w, id);
-    w.Begin(T::kKeyValue);
-    w.Bytes(T::kKeyMaterial, key);
-    w.End();
+    if (withMaterial) {
+      w.Begin(T::kKeyValue);
+      w.Bytes(T::kKeyMaterial, key);
+      w.End();
+    }
     w.Enumeration(T::kCryptographicAlgorithm, 3);  // AES
-    w.Integer(T::kCryptographicLength, static_cast<int32_t>(key.size() * 8));
-    w.End();
-    w.End();
-  });
-}
-
-std::vector<uint8_t> KeyWithoutMaterial(const std::string& id) {
-  return Success(Operation::kGet, [&](Writer& w) {
-    KeyBlockStart(w, id);
-    w.Enumeration(T::kCryptographicAlgorithm, 3);
+    if (withMaterial) w.Integer(T::kCryptographicLength, static_cast<int32_t>(key.size() * 8));
     w.End();
     w.End();
   });

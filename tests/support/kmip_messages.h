@@ -25,10 +25,10 @@ std::vector<uint8_t> Success(Operation op, const PayloadWriter& payload);
 std::vector<uint8_t> Failure(Operation op, uint32_t reason, const std::string& message);
 // Discover Versions answer listing {major, minor} pairs.
 std::vector<uint8_t> Versions(const std::vector<std::pair<int, int>>& versions);
-// Get answer holding a raw AES key.
-std::vector<uint8_t> Key(const std::string& id, const std::vector<uint8_t>& key);
-// Get answer for a symmetric key whose key block has no key material.
-std::vector<uint8_t> KeyWithoutMaterial(const std::string& id);
+// Get answer holding a raw AES key; without material, a symmetric key whose
+// key block has no key value.
+std::vector<uint8_t> Key(const std::string& id, const std::vector<uint8_t>& key,
+                         bool withMaterial = true);
 // Get Attributes answer with the State attribute.
 std::vector<uint8_t> State(const std::string& id, int state);
 

@@ -49,7 +49,7 @@ class LoopbackServer {
   std::mutex mutex_;
   std::set<int> open_;
   std::vector<std::thread> workers_;
-  bool stopped_ = false;
+  std::atomic<bool> stopped_{false};
 };
 
 // What the fake KMIP server does with one request.
@@ -61,16 +61,17 @@ struct FakeReply {
 };
 
 // A KMIP server over TLS whose answers come from a handler. The handler
-// receives each request message (header and value) as it came. In
-// kNoHandshake mode connections are accepted and never answered (not even
+// receives each request message (header and value) as it came. It presents
+// the certificate and key of a name of the test PKI (tests/support/kmip_env.h).
+// In kNoHandshake mode connections are accepted and never answered (not even
 // the TLS handshake).
 class FakeKmipServer {
  public:
   using Handler = std::function<FakeReply(const std::vector<uint8_t>& request)>;
   enum class Mode { kTls, kNoHandshake };
 
-  FakeKmipServer(const std::string& cert_pem, const std::string& key_pem, Handler handler,
-                 Mode mode = Mode::kTls, bool ipv6 = false);
+  explicit FakeKmipServer(Handler handler, const std::string& pkiName = "server",
+                          Mode mode = Mode::kTls, bool ipv6 = false);
   ~FakeKmipServer();
 
   uint16_t port() const { return server_.port(); }
@@ -114,5 +115,10 @@ class TcpRelay {
   std::vector<std::string> targets_;
   LoopbackServer server_;
 };
+
+// A loopback port on which nothing listens (it did a moment ago).
+inline uint16_t ClosedPort() {
+  return LoopbackServer([](int) {}).port();
+}
 
 }  // namespace ZyrdTest

@@ -9,7 +9,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdlib>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -18,38 +17,38 @@ namespace ZyrdTest {
 
 struct RawResponse {
   std::string head;  // status line and headers, up to and including the empty line
-  std::string body;  // as sent: chunk framing is kept
+  std::string body;  // by Content-Length
 };
 
 class RawHttpClient {
  public:
   // Connects to `address` ("127.0.0.1" or "::1") on `port`, at once or, with
   // `connectNow` false, when Connect() is called (the socket exists before).
-  RawHttpClient(const std::string& address, uint16_t port, bool connectNow = true) {
+  explicit RawHttpClient(uint16_t port, const std::string& address = "127.0.0.1",
+                         bool connectNow = true) {
     addrinfo hints{};
     hints.ai_flags = AI_NUMERICHOST | AI_NUMERICSERV;
     hints.ai_socktype = SOCK_STREAM;
-    if (::getaddrinfo(address.c_str(), std::to_string(port).c_str(), &hints, &address_) != 0) {
-      throw std::runtime_error("bad address " + address);
+    if (::getaddrinfo(address.c_str(), std::to_string(port).c_str(), &hints, &address_) != 0 ||
+        (fd_ = ::socket(address_->ai_family, SOCK_STREAM, 0)) < 0) {
+      throw std::runtime_error("no socket for " + address);
     }
-    fd_ = ::socket(address_->ai_family, SOCK_STREAM, 0);
-    if (fd_ < 0) throw std::runtime_error("socket failed");
     timeval timeout{10, 0};
     ::setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof(timeout));
     if (connectNow) Connect();
   }
+  ~RawHttpClient() {
+    if (fd_ >= 0) ::close(fd_);
+    ::freeaddrinfo(address_);
+  }
+  RawHttpClient(const RawHttpClient&) = delete;
+  RawHttpClient& operator=(const RawHttpClient&) = delete;
+
   void Connect() {
     if (::connect(fd_, address_->ai_addr, address_->ai_addrlen) != 0) {
       throw std::runtime_error("connect failed: " + std::to_string(errno));
     }
   }
-  explicit RawHttpClient(uint16_t port) : RawHttpClient("127.0.0.1", port) {}
-  ~RawHttpClient() {
-    ::close(fd_);
-    ::freeaddrinfo(address_);
-  }
-  RawHttpClient(const RawHttpClient&) = delete;
-  RawHttpClient& operator=(const RawHttpClient&) = delete;
 
   // Sends all of `data`; false when the peer stopped taking it.
   bool Send(std::string_view data) {
@@ -64,34 +63,16 @@ class RawHttpClient {
   // Reads until `n` bytes are buffered (or the peer closes) and takes them.
   std::string ReadExactly(size_t n) {
     Fill([&] { return buffered_.size() >= n; });
-    return Take(std::min(n, buffered_.size()));
+    return Take(n);
   }
 
-  // Reads one response: its head, then a body by Content-Length or, for a
-  // chunked one, everything up to the last chunk.
+  // Reads one response: its head, then a body of its Content-Length.
   RawResponse ReadResponse() {
-    RawResponse r;
     Fill([&] { return buffered_.find("\r\n\r\n") != std::string::npos; });
-    const size_t end = buffered_.find("\r\n\r\n");
-    if (end == std::string::npos) return r;
-    r.head = Take(end + 4);
-    if (r.head.find("Transfer-Encoding: chunked\r\n") != std::string::npos) {
-      Fill([&] { return buffered_.find("0\r\n\r\n") != std::string::npos; });
-      // The last chunk is the first "0\r\n\r\n" that starts a size line.
-      size_t pos = 0;
-      for (;;) {
-        const size_t eol = buffered_.find("\r\n", pos);
-        if (eol == std::string::npos) break;
-        const size_t size = std::strtoul(buffered_.substr(pos, eol - pos).c_str(), nullptr, 16);
-        pos = eol + 2 + (size ? size + 2 : 2);
-        if (size == 0) break;
-      }
-      r.body = Take(std::min(pos, buffered_.size()));
-    } else {
-      const size_t at = r.head.find("Content-Length: ");
-      const size_t length = at == std::string::npos ? 0 : std::stoul(r.head.substr(at + 16));
-      r.body = ReadExactly(length);
-    }
+    RawResponse r;
+    r.head = Take(buffered_.find("\r\n\r\n") + 4);
+    const size_t at = r.head.find("Content-Length: ");
+    r.body = ReadExactly(at == std::string::npos ? 0 : std::stoul(r.head.substr(at + 16)));
     return r;
   }
 
@@ -118,7 +99,7 @@ class RawHttpClient {
   }
   std::string Take(size_t n) {
     std::string out = buffered_.substr(0, n);
-    buffered_.erase(0, n);
+    buffered_.erase(0, out.size());
     return out;
   }
 

@@ -1,9 +1,10 @@
 // A scratch directory under $TMPDIR (or /tmp), removed with everything in it
-// when the object goes away.
+// when the object goes away, and reading whole files.
 #pragma once
 
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <string>
 
 namespace ZyrdTest {
@@ -11,10 +12,8 @@ namespace ZyrdTest {
 class TempDir {
  public:
   TempDir() {
-    std::string pattern = (std::filesystem::temp_directory_path() / "zyrd-test-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr) std::abort();
-    text_ = pattern;
-    path_ = pattern;
+    path_ = (std::filesystem::temp_directory_path() / "zyrd-test-XXXXXX").string();
+    if (mkdtemp(path_.data()) == nullptr) std::abort();
   }
   ~TempDir() {
     std::error_code ignored;
@@ -23,15 +22,18 @@ class TempDir {
   TempDir(const TempDir&) = delete;
   TempDir& operator=(const TempDir&) = delete;
 
-  const std::string& Path() const { return text_; }
-  const std::filesystem::path& path() const { return path_; }
+  const std::string& Path() const { return path_; }
   // A path inside the directory.
-  std::string File(const std::string& relative) const { return text_ + "/" + relative; }
-  std::string operator/(const std::string& relative) const { return File(relative); }
+  std::string operator/(const std::string& relative) const { return path_ + "/" + relative; }
 
  private:
-  std::string text_;
-  std::filesystem::path path_;
+  std::string path_;
 };
+
+// The whole content of a file ("" when it cannot be read).
+inline std::string ReadFile(const std::string& path) {
+  std::ifstream in(path, std::ios::binary);
+  return std::string(std::istreambuf_iterator<char>(in), {});
+}
 
 }  // namespace ZyrdTest

@@ -11,6 +11,7 @@
 namespace {
 
 using Orna::Authn::TokenHandler;
+using ZyrdTest::ReadFile;
 
 // "root @ORNA+KMS_ADMIN" when `handler` accepts `token`, "none" when it
 // passes the call on.
@@ -30,11 +31,6 @@ std::string Outcome(TokenHandler& handler, const std::string& token) {
       out = o.result->username + " " + o.result->entitlements.at(0);
   });
   return out;
-}
-
-std::string ReadFile(const std::string& path) {
-  std::ifstream in(path);
-  return std::string(std::istreambuf_iterator<char>(in), {});
 }
 
 mode_t Mode(const std::string& path) {
@@ -99,15 +95,6 @@ TEST(TokenHandlerTest, UnsafeOrUnwritableTokenDisablesAdminAuthentication) {
   std::ofstream(empty) << "\n";
   chmod(empty.c_str(), 0600);
   EXPECT_FALSE(TokenHandler(empty).Enabled());
-}
-
-TEST(EntitlementCheckerTest, GrantsWhenAnyHeldEntitlementIsRequired) {
-  OrnaToken::Authz::JwtEntitlementCheckerImpl checker;
-  Lumo::Authn::AuthenticationResult caller;
-  caller.entitlements = {"@A", "@B"};
-  EXPECT_TRUE(checker.HasAnyEntitlement(caller, {"@X", "@B"}));
-  EXPECT_FALSE(checker.HasAnyEntitlement(caller, {"@X"}));
-  EXPECT_FALSE(checker.HasAnyEntitlement(caller, {}));
 }
 
 }  // namespace

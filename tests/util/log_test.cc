@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <sstream>
 #include <thread>
 
 #include "platform/util/panic.h"
@@ -11,26 +12,19 @@
 namespace {
 
 TEST(LogLevelNames, MapToThresholds) {
-  int t = -5;
-  ASSERT_TRUE(Groundwork::ParseLogLevel("error", &t));
-  EXPECT_EQ(t, 2);
-  ASSERT_TRUE(Groundwork::ParseLogLevel("warning", &t));
-  EXPECT_EQ(t, 3);
-  ASSERT_TRUE(Groundwork::ParseLogLevel("info", &t));
-  EXPECT_EQ(t, 5);
-  ASSERT_TRUE(Groundwork::ParseLogLevel("verbose", &t));
-  EXPECT_EQ(t, 6);
-  ASSERT_TRUE(Groundwork::ParseLogLevel("trivia", &t));
-  EXPECT_EQ(t, 7);
-  ASSERT_TRUE(Groundwork::ParseLogLevel("none", &t));
-  EXPECT_EQ(t, Groundwork::kLogOff);
-  ASSERT_TRUE(Groundwork::ParseLogLevel("4", &t));
-  EXPECT_EQ(t, 4);
-
-  t = 99;
-  EXPECT_FALSE(Groundwork::ParseLogLevel("loud", &t));
-  EXPECT_FALSE(Groundwork::ParseLogLevel("8", &t));
-  EXPECT_FALSE(Groundwork::ParseLogLevel("", &t));
+  for (auto [name, level] : {std::pair{"error", 2},
+                             {"warning", 3},
+                             {"info", 5},
+                             {"verbose", 6},
+                             {"trivia", 7},
+                             {"none", Groundwork::kLogOff},
+                             {"4", 4}}) {
+    int t = -5;
+    ASSERT_TRUE(Groundwork::ParseLogLevel(name, &t)) << name;
+    EXPECT_EQ(t, level) << name;
+  }
+  int t = 99;
+  for (const char* bad : {"loud", "8", ""}) EXPECT_FALSE(Groundwork::ParseLogLevel(bad, &t)) << bad;
   EXPECT_EQ(t, 99);
 }
 
@@ -55,20 +49,17 @@ TEST(LogThreshold, LevelsZeroAndOnePassWheneverLoggingIsOn) {
   EXPECT_EQ(capture.Lines().size(), 2u);
 }
 
-TEST(LogRecords, LongRecordsAreNotTruncated) {
+TEST(LogRecords, FormattedLineCarriesPrefixAndOneLineFeedAndIsNeverTruncated) {
   ZyrdTest::LogCapture capture;
   std::string big(5000, 'x');
   Log_Level(5, "%s\n", big.c_str());
   ASSERT_EQ(capture.Lines().size(), 1u);
   EXPECT_EQ(capture.Lines()[0].text, big + "\n");
-}
 
-TEST(LogRecords, FormattedLineCarriesPrefixAndOneLineFeed) {
   Groundwork::SetLogThreadName("tester");
   std::string line = Groundwork::FormatLogLine(3, "hello\n");
   EXPECT_NE(line.find(" zyrd[" + std::to_string(getpid()) + "] warning [tester] hello\n"),
             std::string::npos);
-  EXPECT_EQ(line.back(), '\n');
   EXPECT_EQ(line.find('\n'), line.size() - 1);
   EXPECT_EQ(Groundwork::FormatLogLine(5, "no newline").back(), '\n');
   Groundwork::SetLogThreadName("");
@@ -88,44 +79,36 @@ TEST(LogRecords, ConcurrentStderrLinesDoNotInterleave) {
     ssize_t n;
     while ((n = read(fds[0], buf, sizeof buf)) > 0) collected.append(buf, static_cast<size_t>(n));
   });
-  {
-    int saved = Groundwork::GetLogThreshold();
-    Groundwork::SetLogThreshold(5);
-    std::vector<std::thread> writers;
-    for (int t = 0; t < 4; ++t) {
-      writers.emplace_back([t] {
-        std::string payload(300, static_cast<char>('a' + t));
-        for (int i = 0; i < 200; ++i) Log_Level(5, "%s\n", payload.c_str());
-      });
-    }
-    for (auto& w : writers) w.join();
-    Groundwork::SetLogThreshold(saved);
+  int saved = Groundwork::GetLogThreshold();
+  Groundwork::SetLogThreshold(5);
+  std::vector<std::thread> writers;
+  for (int t = 0; t < 4; ++t) {
+    writers.emplace_back([t] {
+      std::string payload(300, static_cast<char>('a' + t));
+      for (int i = 0; i < 200; ++i) Log_Level(5, "%s\n", payload.c_str());
+    });
   }
+  for (auto& w : writers) w.join();
+  Groundwork::SetLogThreshold(saved);
   dup2(savedStderr, STDERR_FILENO);
   close(savedStderr);
   reader.join();
   close(fds[0]);
 
+  std::istringstream in(collected);
   size_t lines = 0;
-  size_t pos = 0;
-  while (pos < collected.size()) {
-    size_t end = collected.find('\n', pos);
-    ASSERT_NE(end, std::string::npos);
-    std::string_view line(collected.data() + pos, end - pos);
-    std::string_view payload = line.substr(line.size() - 300);
+  for (std::string line; std::getline(in, line); ++lines) {
+    std::string_view payload = std::string_view(line).substr(line.size() - 300);
     EXPECT_EQ(payload.find_first_not_of(payload[0]), std::string_view::npos) << line;
-    ++lines;
-    pos = end + 1;
   }
   EXPECT_EQ(lines, 800u);
+  EXPECT_EQ(collected.back(), '\n');
 }
 
-TEST(PanicDeathTest, VerifyNamesFileWithoutExtensionAndLine) {
+// The record reaches standard error even when logging is off.
+TEST(PanicDeathTest, VerifyAndNotReachedNameFileWithoutExtensionAndLine) {
   EXPECT_DEATH(VERIFY(1 + 1 == 3), "VERIFY tests/util/log_test:[0-9]+");
   EXPECT_DEATH(NOT_REACHED(), "NOT_REACHED tests/util/log_test:[0-9]+");
-}
-
-TEST(PanicDeathTest, ReachesStderrEvenWhenLoggingIsOff) {
   EXPECT_DEATH(
       {
         Groundwork::SetLogThreshold(Groundwork::kLogOff);

@@ -1,0 +1,213 @@
+# Real processes for black-box tests: zyrd under a scratch root, a PyKMIP
+# server with a throwaway PKI, a JSON-RPC client, and the developer tools.
+
+import http.client
+import json
+import os
+import pathlib
+import signal
+import socket
+import subprocess
+import sys
+import tempfile
+import time
+
+BUILD_DIR = pathlib.Path(os.environ.get("ZYRD_BUILD_DIR", "build")).resolve()
+SOURCE_DIR = pathlib.Path(__file__).resolve().parents[2]
+TOOLS = SOURCE_DIR / "tools"
+sys.path.insert(0, str(TOOLS))
+
+import pykmip_tool  # noqa: E402
+
+
+def free_port():
+    # A 127.0.0.1 port nothing listens on (it was free a moment ago).
+    with socket.socket() as s:
+        s.bind(("127.0.0.1", 0))
+        return s.getsockname()[1]
+
+
+def write_config(root, body):
+    path = pathlib.Path(root) / "etc/tarsel/cpservices/zyrd/config.xml"
+    path.parent.mkdir(parents=True, exist_ok=True)
+    path.write_text("<config>%s</config>\n" % body)
+    return path
+
+
+class Daemon:
+    # A zyrd process on a free port (unless env names one) with the metadata
+    # installed under root; its standard error goes to a zyrd-*.log there.
+
+    def __init__(self, root, env=None):
+        metadata = pathlib.Path(root) / "usr/lib/tarsel/lumo/zyr_lumo_metadata.json"
+        metadata.parent.mkdir(parents=True, exist_ok=True)
+        metadata.write_bytes((SOURCE_DIR / "metadata/zyr_lumo_metadata.json").read_bytes())
+        env = {**os.environ, "ZYRD_ROOT": str(root), "ZYRD_HTTP_PORT": "0", **(env or {})}
+        fd, self.log = tempfile.mkstemp(prefix="zyrd-", suffix=".log", dir=root)
+        self.log = pathlib.Path(self.log)
+        self.proc = subprocess.Popen([str(BUILD_DIR / "zyrd")], stdin=subprocess.DEVNULL,
+                                     stdout=subprocess.DEVNULL, stderr=fd, env=env)
+        os.close(fd)
+
+    def lines(self):
+        return self.log.read_text(errors="replace").splitlines()
+
+    def _until(self, done, what, timeout=10.0):
+        # Polls done() until it holds; fails when the daemon ended or time ran out.
+        deadline = time.monotonic() + timeout
+        while not done():
+            if self.proc.poll() is not None or time.monotonic() > deadline:
+                time.sleep(0.1)  # what the daemon wrote last
+                if done():
+                    return
+                raise AssertionError("no %s; log:\n%s" % (what, "\n".join(self.lines())))
+            time.sleep(0.02)
+
+    def wait_for(self, fragment):
+        # Returns the first line containing fragment, or fails.
+        found = lambda: [line for line in self.lines() if fragment in line]  # noqa: E731
+        self._until(found, "line with %r" % fragment)
+        return found()[0]
+
+    def http_port(self):
+        return int(self.wait_for("HTTP endpoint listening on TCP port ").rsplit(" ", 1)[1])
+
+    def handles_sigterm(self):
+        # Whether the process has installed its SIGTERM handler (start-up done).
+        try:
+            with open("/proc/%d/status" % self.proc.pid) as f:
+                caught = next(line for line in f if line.startswith("SigCgt:")).split()[1]
+            return bool(int(caught, 16) & (1 << (signal.SIGTERM - 1)))
+        except (OSError, StopIteration):
+            return False
+
+    def stop(self, sig=signal.SIGTERM, timeout=10.0):
+        # Waits for the end of start-up, signals, and returns the exit status.
+        self._until(self.handles_sigterm, "end of start-up")
+        self.proc.send_signal(sig)
+        return self.proc.wait(timeout)
+
+    def kill(self):
+        if self.proc.poll() is None:
+            self.proc.kill()
+        self.proc.wait()
+
+
+class KmipServer:
+    # PyKMIP on a free 127.0.0.1 port; certificates are cert_path(name) and
+    # key_path(name) (pykmip_tool.PKI_NAMES). Always stop() it.
+
+    def __init__(self, workdir):
+        self.pki = pathlib.Path(workdir) / "pki"
+        self.run = pathlib.Path(workdir) / "run"
+        pykmip_tool.make_pki(self.pki)
+        self.port = None
+        self.proc = None
+
+    def cert_path(self, name):
+        return self.pki / (name + ".pem")
+
+    def key_path(self, name):
+        return self.pki / (name + ".key")
+
+    def pem(self, name):
+        return self.cert_path(name).read_text()
+
+    def start(self, timeout=30.0):
+        self.port = free_port()
+        conf = pykmip_tool.write_server_config(self.pki, self.port, self.run)
+        with open(self.run / "server.out", "ab") as out:
+            self.proc = subprocess.Popen(
+                ["/usr/bin/pykmip-server", "-f", str(conf), "-l", str(self.run / "server.log")],
+                stdin=subprocess.DEVNULL, stdout=out, stderr=out)
+        deadline = time.monotonic() + timeout
+        while True:
+            try:
+                socket.create_connection(("127.0.0.1", self.port), timeout=0.5).close()
+                return self
+            except OSError:
+                if self.proc.poll() is not None or time.monotonic() > deadline:
+                    self.stop()
+                    raise AssertionError("PyKMIP did not start:\n" + "".join(
+                        p.read_text(errors="replace") for p in self.run.glob("server.*")))
+                time.sleep(0.05)
+
+    def stop(self):
+        if self.proc is not None and self.proc.poll() is None:
+            self.proc.send_signal(signal.SIGINT)  # SIGTERM waits for an accept time-out
+            try:
+                self.proc.wait(10)
+            except subprocess.TimeoutExpired:
+                self.proc.kill()
+                self.proc.wait()
+
+    def admin(self, *commands):
+        # Runs commands (pykmip_tool.Admin.run word lists) as client "client"
+        # in one session; returns their outputs.
+        admin = pykmip_tool.Admin(self.pki, self.port)
+        try:
+            return [admin.run(list(c)) for c in commands]
+        finally:
+            admin.close()
+
+    def create_key(self, bits):
+        # An active AES key of `bits` bits; returns its id.
+        uid = self.admin(("create", str(bits)))[0]
+        self.admin(("activate", uid))
+        return uid
+
+
+class Client:
+    # One kept-alive HTTP connection to a daemon.
+
+    def __init__(self, port):
+        self.conn = http.client.HTTPConnection("127.0.0.1", port, timeout=30)
+        self.next_id = 1
+
+    def call(self, method, params=None, token=None):
+        # Returns (lumo-error header or None, the decoded JSON-RPC response).
+        body = {"jsonrpc": "2.0", "id": self.next_id, "method": method}
+        self.next_id += 1
+        if params is not None:
+            body["params"] = params
+        headers = {"Content-Type": "application/json"}
+        if token:
+            headers["Authorization"] = "Bearer " + token
+        self.conn.request("POST", "/api", json.dumps(body), headers)
+        response = self.conn.getresponse()
+        data = response.read()
+        assert response.status == 200, (response.status, data)
+        return response.getheader("lumo-error"), json.loads(data)
+
+
+def seed(root, spec):
+    # Stores providers (and the attestation certificate) in the root's store.
+    subprocess.run([str(TOOLS / "zyrd-seed"), "--cfgvault", str(BUILD_DIR / "cfgvault"), "-"],
+                   input=json.dumps(spec).encode(), check=True,
+                   env={"ZYRD_ROOT": str(root), "PATH": "/usr/bin:/bin"})
+
+
+def make_attestation_key(directory):
+    # Returns the private key's path and the certificate's text.
+    subprocess.run([str(TOOLS / "make-attestation-key"), str(directory)], check=True,
+                   stdout=subprocess.DEVNULL)
+    d = pathlib.Path(directory)
+    return d / "attestation-key.pem", (d / "attestation-cert.pem").read_text()
+
+
+def mint(key_path, *args):
+    done = subprocess.run([str(TOOLS / "mint-attestation-token"), "--key", str(key_path), *args],
+                          check=True, stdout=subprocess.PIPE)
+    return done.stdout.decode().strip()
+
+
+def audit_records(root, at_least=0, timeout=5.0):
+    # The audit records so far; waits until there are `at_least` of them
+    # (a call's record is written as it completes, around its response).
+    path = pathlib.Path(root) / "var/log/zyrd/audit.log"
+    deadline = time.monotonic() + timeout
+    while True:
+        lines = path.read_text().splitlines() if path.exists() else []
+        if len(lines) >= at_least or time.monotonic() > deadline:
+            return [json.loads(line) for line in lines if line]
+        time.sleep(0.02)
