@@ -2,9 +2,8 @@
 """Throwaway PKI, PyKMIP server configuration and key administration for a
 local KMIP server (make run, the benchmarks and the tests).
 
-Used as a module by the pytest suites (tests/e2e/kmip_server.py) and as a
-command-line tool by scripts/local-env.sh and the C++ test harness
-(tests/support/pykmip_server.h):
+Used as a module by the test harness (tests/e2e/harness.py) and as a
+command-line tool by scripts/local-env.sh:
 
   pykmip_tool.py pki DIR
       Writes a test PKI into DIR (see make_pki for the file names).

@@ -4,6 +4,9 @@
 
 #include <atomic>
 #include <future>
+#include <thread>
+
+#include "platform/runtime/thread_pool.h"
 
 namespace {
 
@@ -36,6 +39,28 @@ TEST(AsioScheduler, CancelledItemNeverRuns) {
   scheduler.Schedule(100ms, [&] { later.set_value(); });
   ASSERT_EQ(later.get_future().wait_for(5s), std::future_status::ready);
   EXPECT_FALSE(ran.load());
+}
+
+
+// Long tasks (the endpoint's I/O loops) queued while an idle thread has not
+// yet woken must still each get a thread of their own.
+TEST(ThreadPool, TasksQueuedFasterThanIdleThreadsWakeEachGetAThread) {
+  Strake::Service::ThreadPool pool(4, "t-");
+  std::promise<void> release;
+  auto gate = release.get_future().share();
+  std::atomic<int> started{0};
+  pool.Enqueue([&] { ++started; });  // one thread exists, then goes idle
+  for (int i = 0; i < 500 && started.load() < 1; ++i) std::this_thread::sleep_for(2ms);
+  std::this_thread::sleep_for(10ms);
+  for (int i = 0; i < 3; ++i) {
+    pool.Enqueue([&, gate] {
+      ++started;
+      gate.wait();
+    });
+  }
+  for (int i = 0; i < 500 && started.load() < 4; ++i) std::this_thread::sleep_for(2ms);
+  EXPECT_EQ(started.load(), 4);
+  release.set_value();
 }
 
 }  // namespace
