@@ -55,9 +55,6 @@ KmsResult CheckMasterKey(size_t length, int32_t state, MasterKeyFlags& flags, st
 // a decimal "1.x" with x not below "1" in text order ("1.1", "1.4", "1.10").
 bool IsVersionSupported(const std::string& version);
 
-// Lower-case hexadecimal of every byte of `text`.
-std::string HexEncode(std::string_view text);
-
 class KmipKms final : public Kms {
  public:
   explicit KmipKms(std::shared_ptr<const KmsInfo> info);

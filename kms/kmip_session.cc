@@ -6,6 +6,7 @@
 #include "kms/kmip_kms.h"
 #include "platform/kmip/qlkmipsimple.h"
 #include "platform/ssl/ssl_utils.h"
+#include "platform/util/hex.h"
 #include "platform/util/log.h"
 
 namespace Zyrd::Kms {
@@ -21,7 +22,9 @@ void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert,
   if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
     Log_Level(3, "%s", warning);
   }
-  out.str().append(", Trusted_Cert=PEM:[").append(HexEncode(cert)).append("]");
+  out.str().append(", Trusted_Cert=PEM:[");
+  Groundwork::AppendHex(cert, out.str());
+  out.str().append("]");
 }
 
 }  // namespace
@@ -33,17 +36,6 @@ KmsResult MapKmipError(int error) {
     case kKmipErrorTimeout: return KeyServerTimeout;
     default: return KmipFailure;
   }
-}
-
-std::string HexEncode(std::string_view text) {
-  static constexpr char kDigits[] = "0123456789abcdef";
-  std::string out;
-  out.reserve(text.size() * 2);
-  for (unsigned char c : text) {
-    out.push_back(kDigits[c >> 4]);
-    out.push_back(kDigits[c & 0x0f]);
-  }
-  return out;
 }
 
 KmipKms::KmipKms(std::shared_ptr<const KmsInfo> info)
@@ -97,10 +89,11 @@ Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
     if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
       Log_Level(3, "Could not standardize client certificate.\n");
     }
-    std::string certHex = HexEncode(cert);
-    Groundwork::SecureString keyHex(HexEncode(info_->clientPrivateKey));
+    std::string certHex = Groundwork::HexEncode(cert);
     out.append("Certificate=PEM:[").append(certHex).append("], Public=PEM:[").append(certHex);
-    out.append("], Private=PEM:[").append(keyHex.view()).append("],");
+    out.append("], Private=PEM:[");
+    Groundwork::AppendHex(info_->clientPrivateKey, out);  // straight into wiping memory
+    out.append("],");
   }
   out.append("User_Trust, Authenticate}");
   if (withTrust) {

@@ -5,6 +5,7 @@
 #include <type_traits>
 
 #include "platform/kmip/item_list.h"
+#include "platform/util/hex.h"
 
 namespace Qlc {
 namespace {
@@ -217,14 +218,6 @@ class DescriptionReader {
   std::string* error_;
 };
 
-void AppendHex(std::string_view text, Groundwork::SecureString* out) {
-  static constexpr char kDigits[] = "0123456789abcdef";
-  for (unsigned char c : text) {
-    out->str().push_back(kDigits[c >> 4]);
-    out->str().push_back(kDigits[c & 15]);
-  }
-}
-
 }  // namespace
 
 bool ParseSessionDescription(std::string_view text, SessionConfig* out, std::string* error) {
@@ -250,17 +243,17 @@ Groundwork::SecureString FormatSessionDescription(const SessionConfig& c) {
        "', Timeout=" + std::to_string(c.timeoutSeconds) + ":Seconds, ";
   if (!c.clientCertificate.empty()) {
     s += "Certificate=PEM:[";
-    AppendHex(c.clientCertificate, &out);
+    Groundwork::AppendHex(c.clientCertificate, s);
     s += "], Public=PEM:[";
-    AppendHex(c.clientCertificate, &out);
+    Groundwork::AppendHex(c.clientCertificate, s);
     s += "], Private=PEM:[";
-    AppendHex(c.clientPrivateKey.view(), &out);
+    Groundwork::AppendHex(c.clientPrivateKey.view(), s);
     s += "],";
   }
   s += "User_Trust, Authenticate}";
   for (const std::string& cert : c.trustedCertificates) {
     s += ", Trusted_Cert=PEM:[";
-    AppendHex(cert, &out);
+    Groundwork::AppendHex(cert, s);
     s += "]";
   }
   return out;

@@ -3,6 +3,7 @@
 #include <openssl/evp.h>
 
 #include "platform/lumo/core_messages.h"
+#include "platform/util/hex.h"
 #include "platform/util/panic.h"
 
 namespace Lumo::Provider {
@@ -37,11 +38,7 @@ AsyncLocalProvider::AsyncLocalProvider(
   unsigned char digest[EVP_MAX_MD_SIZE];
   unsigned int length = 0;
   EVP_Digest(all.data(), all.size(), digest, &length, EVP_sha256(), nullptr);
-  static constexpr char kHex[] = "0123456789abcdef";
-  for (unsigned int i = 0; i < length; ++i) {
-    checksum_.push_back(kHex[digest[i] >> 4]);
-    checksum_.push_back(kHex[digest[i] & 15]);
-  }
+  Groundwork::AppendHex({reinterpret_cast<const char*>(digest), length}, checksum_);
 }
 
 void AsyncLocalProvider::Add(const ApiInterfacePtr& iface) {

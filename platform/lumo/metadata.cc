@@ -8,6 +8,7 @@
 #include <sstream>
 
 #include "platform/lumo/core_messages.h"
+#include "platform/util/hex.h"
 
 namespace Lumo::Provider::Metadata {
 namespace {
@@ -16,14 +17,7 @@ std::string Sha256Hex(const std::string& text) {
   unsigned char digest[EVP_MAX_MD_SIZE];
   unsigned int length = 0;
   EVP_Digest(text.data(), text.size(), digest, &length, EVP_sha256(), nullptr);
-  static constexpr char kHex[] = "0123456789abcdef";
-  std::string out;
-  out.reserve(length * 2);
-  for (unsigned int i = 0; i < length; ++i) {
-    out.push_back(kHex[digest[i] >> 4]);
-    out.push_back(kHex[digest[i] & 15]);
-  }
-  return out;
+  return Groundwork::HexEncode({reinterpret_cast<const char*>(digest), length});
 }
 
 // The string member `key` of `obj`, or null (with `reason` set) when it is

@@ -8,6 +8,7 @@
 
 #include "platform/ssl/openssl_ptr.h"
 #include "platform/util/base64.h"
+#include "platform/util/hex.h"
 
 namespace Kestrel::Common::SslUtils {
 namespace {
@@ -97,14 +98,7 @@ bool ComputeHashHex(std::string_view data, std::string& hex, const char* algorit
     ERR_clear_error();
     return false;
   }
-  static constexpr char kDigits[] = "0123456789abcdef";
-  std::string out;
-  out.reserve(length * 2);
-  for (unsigned int i = 0; i < length; ++i) {
-    out.push_back(kDigits[digest[i] >> 4]);
-    out.push_back(kDigits[digest[i] & 0x0f]);
-  }
-  hex = std::move(out);
+  hex = Groundwork::HexEncode({reinterpret_cast<const char*>(digest), length});
   return true;
 }
 

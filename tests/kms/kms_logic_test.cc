@@ -3,11 +3,13 @@
 #include <gtest/gtest.h>
 
 #include "kms/kmip_kms.h"
+#include "platform/util/hex.h"
 #include "tests/support/log_capture.h"
 
 namespace {
 
 using namespace Zyrd::Kms;
+using Groundwork::HexEncode;
 
 // Syntactically valid certificate blocks (the base64 need not be a real
 // certificate for standardisation); B is not in the standard layout.
