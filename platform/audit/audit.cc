@@ -80,15 +80,8 @@ void SetAuditSink(AuditSink* sink) { gSink.store(sink); }
 
 std::string FormatRecord(int64_t timeUs, const char* eventId, const char* subject,
                          const char* object, bool success, const TslAudit_Attr* attrs) {
-  time_t seconds = static_cast<time_t>(timeUs / 1000000);
-  struct tm tm;
-  gmtime_r(&seconds, &tm);
-  char time[64];
-  snprintf(time, sizeof(time), "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", tm.tm_year + 1900,
-           tm.tm_mon + 1, tm.tm_mday, tm.tm_hour, tm.tm_min, tm.tm_sec,
-           static_cast<int>((timeUs / 1000) % 1000));
   boost::json::object record;
-  record["time"] = time;
+  record["time"] = Groundwork::FormatUtcMillis(timeUs);
   record["eventId"] = eventId != nullptr ? eventId : "";
   record["subject"] = subject != nullptr ? subject : "";
   record["object"] = object != nullptr ? object : "";

@@ -3,6 +3,8 @@
 #include <sys/time.h>
 #include <time.h>
 
+#include <cstdio>
+
 uint64_t Hostinfo_SystemTimerNS() {
   struct timespec ts;
   clock_gettime(CLOCK_MONOTONIC, &ts);
@@ -16,6 +18,18 @@ int64_t Hostinfo_GetTimeOfDay() {
 }
 
 namespace Groundwork {
+
+std::string FormatUtcMillis(int64_t microsSinceEpoch) {
+  time_t seconds = static_cast<time_t>(microsSinceEpoch / 1000000);
+  struct tm tm;
+  gmtime_r(&seconds, &tm);
+  char text[64];
+  snprintf(text, sizeof text, "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", tm.tm_year + 1900,
+           tm.tm_mon + 1, tm.tm_mday, tm.tm_hour, tm.tm_min, tm.tm_sec,
+           static_cast<int>((microsSinceEpoch / 1000) % 1000));
+  return text;
+}
+
 namespace {
 
 class HostClock final : public Clock {

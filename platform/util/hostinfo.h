@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <string>
 
 // Monotonic time in nanoseconds (CLOCK_MONOTONIC); only differences matter.
 uint64_t Hostinfo_SystemTimerNS();
@@ -10,6 +11,9 @@ uint64_t Hostinfo_SystemTimerNS();
 int64_t Hostinfo_GetTimeOfDay();
 
 namespace Groundwork {
+
+// "2026-12-06T09:43:00.123Z": UTC with milliseconds, for log and audit lines.
+std::string FormatUtcMillis(int64_t microsSinceEpoch);
 
 class Clock {
  public:

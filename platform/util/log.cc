@@ -1,7 +1,6 @@
 #include "platform/util/log.h"
 
 #include <sys/syscall.h>
-#include <sys/time.h>
 #include <pthread.h>
 #include <unistd.h>
 
@@ -10,6 +9,8 @@
 #include <cstdio>
 #include <ctime>
 #include <vector>
+
+#include "platform/util/hostinfo.h"
 
 namespace Groundwork {
 namespace {
@@ -88,14 +89,7 @@ bool HasCustomLogSink() { return gSink.load(std::memory_order_acquire) != nullpt
 void SetLogThreadName(std::string name) { tThreadName = std::move(name); }
 
 std::string FormatLogLine(int level, std::string_view text) {
-  struct timeval tv;
-  gettimeofday(&tv, nullptr);
-  struct tm tm;
-  gmtime_r(&tv.tv_sec, &tm);
-  char stamp[64];
-  snprintf(stamp, sizeof stamp, "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", tm.tm_year + 1900,
-           tm.tm_mon + 1, tm.tm_mday, tm.tm_hour, tm.tm_min, tm.tm_sec,
-           static_cast<int>(tv.tv_usec / 1000));
+  std::string stamp = FormatUtcMillis(Hostinfo_GetTimeOfDay());
   std::string thread = tThreadName;
   if (thread.empty()) thread = std::to_string(static_cast<long>(syscall(SYS_gettid)));
 
