@@ -3,7 +3,7 @@ BUILD_DIR ?= build
 RUN_ROOT ?= $(CURDIR)/.run
 CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DZYRD_WERROR=ON
 
-.PHONY: all deps build test run bench clean
+.PHONY: all deps build test run bench fuzz clean
 
 all: build
 
@@ -26,6 +26,9 @@ run: build
 bench: build
 	bench/run-http-bench $(BUILD_DIR)
 	bench/run-key-bench $(BUILD_DIR)
+
+fuzz: deps
+	scripts/run-fuzzers --explore
 
 clean:
 	rm -rf $(BUILD_DIR) build-fuzz $(RUN_ROOT)

@@ -190,4 +190,17 @@ RequestHeadParser::Status RequestHeadParser::Parse(std::string_view input, size_
   return Status::kComplete;
 }
 
+bool RequestHeadParser::DeclaredBodyTooLarge() const {
+  return parser_ && parser_->is_header_done() && !parser_->is_done() && facts_.contentLength &&
+         *facts_.contentLength > bodyLimit_;
+}
+
+size_t RequestHeadParser::PutBody(boost::asio::const_buffer bytes, boost::beast::error_code& ec) {
+  if (DeclaredBodyTooLarge()) {
+    ec = http::error::body_limit;
+    return 0;
+  }
+  return parser_->put(bytes, ec);
+}
+
 }  // namespace Lumo::Transport::PicoHttp

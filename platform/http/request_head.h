@@ -4,6 +4,8 @@
 // socket, so each piece can be tested and fuzzed on bytes alone.
 #pragma once
 
+#include <boost/asio/buffer.hpp>
+#include <boost/beast/core/error.hpp>
 #include <boost/beast/http/fields.hpp>
 #include <boost/beast/http/parser.hpp>
 #include <boost/beast/http/string_body.hpp>
@@ -102,6 +104,15 @@ class RequestHeadParser {
   boost::system::error_code Error() const { return error_; }
   const RequestFacts& Facts() const { return facts_; }
   RequestParser& Parser() { return *parser_; }
+
+  // True once the head is complete and it declares a Content-Length above
+  // the body limit (and the body is not skipped).
+  bool DeclaredBodyTooLarge() const;
+
+  // Feeds body bytes to the parser; returns the bytes taken. A declared
+  // length above the limit fails with http::error::body_limit before Beast
+  // sees a byte: its string body reserves the declared length up front.
+  size_t PutBody(boost::asio::const_buffer bytes, boost::beast::error_code& ec);
 
  private:
   Status Fail(HttpError e);

@@ -185,8 +185,7 @@ void Session::OnHead() {
     }
     return;
   }
-  if (facts.contentLength && !head_->Parser().is_done() &&
-      *facts.contentLength > context_->config.httpBodySizeLimitInBytes) {
+  if (head_->DeclaredBodyTooLarge()) {
     Refuse("request_exceeds_max_size", "lumo.request.exceeds.max.size");
     return;
   }
@@ -206,7 +205,7 @@ void Session::ReadBody() {
       return;
     }
     beast::error_code ec;
-    const size_t n = parser.put(buffer_.data(), ec);
+    const size_t n = head_->PutBody(buffer_.data(), ec);
     Consume(n);
     if (ec == http::error::body_limit) {
       Refuse("request_exceeds_max_size", "lumo.request.exceeds.max.size");

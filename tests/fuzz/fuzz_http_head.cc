@@ -25,11 +25,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   if (status != RequestHeadParser::Status::kComplete) return 0;
 
-  auto& body = parser.Parser();
-  while (!body.is_done() && offset < input.size()) {
+  while (!parser.Parser().is_done() && offset < input.size()) {
     boost::beast::error_code ec;
     const size_t n =
-        body.put(boost::asio::buffer(input.data() + offset, input.size() - offset), ec);
+        parser.PutBody(boost::asio::buffer(input.data() + offset, input.size() - offset), ec);
     offset += n;
     if (ec || n == 0) break;
   }

@@ -2,6 +2,7 @@
 #include "platform/http/request_head.h"
 
 #include <gtest/gtest.h>
+#include <boost/beast/http/error.hpp>
 
 namespace {
 
@@ -44,6 +45,26 @@ TEST(RequestHeadParser, HeadArrivingInPiecesParsesAsAWhole) {
     EXPECT_EQ(f.contentLength, 7u);
     EXPECT_FALSE(parser.Parser().is_done());
   }
+}
+
+// A huge declared length is refused before the body parser allocates for it.
+TEST(RequestHeadParser, DeclaredBodyAboveTheLimitIsRefusedWithoutBuffering) {
+  for (const char* length : {"2500001", "000000000000000000090000379213"}) {
+    RequestHeadParser parser(64 * 1024, 2'500'000);
+    const std::string input = std::string("POST /api HTTP/1.1\r\nContent-Length: ") + length +
+                              "\r\nContent-Type: application/json\r\n\r\n{}";
+    size_t consumed = 0;
+    ASSERT_EQ(parser.Parse(input, &consumed), Status::kComplete) << length;
+    EXPECT_TRUE(parser.DeclaredBodyTooLarge());
+    boost::beast::error_code ec;
+    EXPECT_EQ(parser.PutBody(boost::asio::buffer(input.data() + consumed, 2), ec), 0u);
+    EXPECT_EQ(ec, boost::beast::http::error::body_limit);
+  }
+  RequestHeadParser parser(64 * 1024, 2'500'000);
+  size_t consumed = 0;
+  ASSERT_EQ(parser.Parse("POST / HTTP/1.1\r\nContent-Length: 2500000\r\n\r\n", &consumed),
+            Status::kComplete);
+  EXPECT_FALSE(parser.DeclaredBodyTooLarge());
 }
 
 // Parses a whole head; returns the facts and what followed the head.
