@@ -13,6 +13,7 @@
 #include <cstdio>
 #include <mutex>
 
+#include "platform/util/files.h"
 #include "platform/util/hostinfo.h"
 #include "platform/util/log.h"
 #include "platform/util/paths.h"
@@ -46,11 +47,7 @@ class FileSink final : public AuditSink {
     if (fd_.load() >= 0) return fd_.load();
     std::string path = Groundwork::RootPath(kAuditLogPath);
     std::string dir = path.substr(0, path.rfind('/'));
-    // Create the missing directories; each one that exists is left as it is.
-    for (size_t pos = 1; pos != std::string::npos;) {
-      pos = dir.find('/', pos + 1);
-      ::mkdir(dir.substr(0, pos).c_str(), 0700);
-    }
+    Groundwork::MakeDirectories(dir, 0700);
     fd = ::open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
     if (fd < 0) {
       if (!failing_) Log_Level(2, "Cannot open audit log %s: %s\n", path.c_str(), strerror(errno));

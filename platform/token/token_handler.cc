@@ -12,6 +12,7 @@
 #include <cctype>
 
 #include "platform/util/base64.h"
+#include "platform/util/files.h"
 #include "platform/util/log.h"
 
 namespace Orna::Authn {
@@ -38,25 +39,6 @@ Groundwork::SecureString EncodeToken(const Groundwork::SecureBytes& bytes) {
   return text;
 }
 
-// Creates each missing directory of `dir` (0700); existing ones stay as they are.
-void MakeDirectories(const std::string& dir) {
-  for (size_t pos = 1; pos != std::string::npos;) {
-    pos = dir.find('/', pos + 1);
-    ::mkdir(dir.substr(0, pos).c_str(), 0700);
-  }
-}
-
-bool WriteAll(int fd, const char* data, size_t size) {
-  while (size > 0) {
-    ssize_t n = ::write(fd, data, size);
-    if (n < 0 && errno == EINTR) continue;
-    if (n <= 0) return false;
-    data += n;
-    size -= static_cast<size_t>(n);
-  }
-  return true;
-}
-
 }  // namespace
 
 TokenHandler::TokenHandler(std::string tokenPath, RandomSource random)
@@ -75,7 +57,7 @@ bool TokenHandler::LoadOrCreate(const RandomSource& random) {
     // into place, so the token file appears complete or not at all, and a
     // concurrent creator's token wins.
     std::string dir = path_.substr(0, path_.rfind('/'));
-    MakeDirectories(dir);
+    Groundwork::MakeDirectories(dir, 0700);
     Groundwork::SecureBytes bytes(kTokenBytes);
     if (!random(bytes.data(), bytes.size())) {
       Log_Level(2, "Cannot generate an admin token\n");
@@ -85,7 +67,8 @@ bool TokenHandler::LoadOrCreate(const RandomSource& random) {
     text.str().push_back('\n');
     std::string tmp = path_ + ".tmp." + std::to_string(::getpid());
     int out = ::open(tmp.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, 0600);
-    bool written = out >= 0 && WriteAll(out, text.data(), text.size()) && ::fsync(out) == 0;
+    bool written =
+        out >= 0 && Groundwork::WriteAll(out, text.data(), text.size()) && ::fsync(out) == 0;
     if (out >= 0) ::close(out);
     if (!written || (::link(tmp.c_str(), path_.c_str()) != 0 && errno != EEXIST)) {
       Log_Level(2, "Cannot create admin token %s: %s\n", path_.c_str(), strerror(errno));
