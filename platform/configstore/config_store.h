@@ -60,7 +60,8 @@ class ConfigStore {
   virtual std::string Export(const std::vector<FilterSpecObject>& filters) = 0;
   // Replaces, in one transaction, every stored instance of each key, group
   // and component that `text` covers with the text's instances. A text that
-  // the codec refuses returns false with the reason appended to `errors` and
+  // the codec refuses, or that gives a known record value another type
+  // (record_types.h), returns false with the reason appended to `errors` and
   // changes nothing; a database failure throws (and changes nothing).
   virtual bool Import(const std::string& text, std::vector<ErrorInfo>& errors) = 0;
 

@@ -12,6 +12,7 @@
 #include <fstream>
 
 #include "platform/configstore/export_codec.h"
+#include "platform/configstore/record_types.h"
 
 namespace OrnaConfigStore {
 namespace {
@@ -307,7 +308,7 @@ std::string SqliteConfigStore::Export(const std::vector<FilterSpecObject>& filte
 bool SqliteConfigStore::Import(const std::string& text, std::vector<ErrorInfo>& errors) {
   Codec::ExportContents contents;
   std::string error;
-  if (!Codec::DecodeExport(text, contents, error)) {
+  if (!Codec::DecodeExport(text, contents, error) || !CheckRecordTypes(contents.objects, error)) {
     errors.push_back({std::move(error)});
     return false;
   }
