@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "platform/util/base64.h"
+
 namespace Lumo::Bindings {
 
 DecodeError::DecodeError(std::string path, std::string problem)
@@ -114,6 +116,15 @@ std::vector<std::string> ObjectReader::StringList(std::string_view name) {
 std::optional<std::vector<std::string>> ObjectReader::OptionalStringList(std::string_view name) {
   if (Optional(name) == nullptr) return std::nullopt;
   return StringList(name);
+}
+
+Groundwork::SecureBytes ObjectReader::Binary(std::string_view name) {
+  const boost::json::string& s = RequiredString(name);
+  Groundwork::SecureBytes bytes;
+  if (!Base64_Decode(std::string_view(s.data(), s.size()), &bytes)) {
+    throw DecodeError(std::string(name), "expected Base64 text");
+  }
+  return bytes;
 }
 
 void ObjectReader::Finish() const {

@@ -60,6 +60,8 @@ class ObjectReader {
   std::optional<bool> OptionalBool(std::string_view name);
   std::vector<std::string> StringList(std::string_view name);
   std::optional<std::vector<std::string>> OptionalStringList(std::string_view name);
+  // A byte sequence sent as standard Base64 text; other text is refused.
+  Groundwork::SecureBytes Binary(std::string_view name);
 
   // A nested record, decoded with its own value_to conversion.
   template <typename T>
@@ -74,12 +76,13 @@ class ObjectReader {
   }
   template <typename T>
   std::vector<T> List(std::string_view name) {
-    const boost::json::value& v = Required(name);
-    if (!v.is_array()) throw DecodeError(std::string(name), "expected a list");
-    std::vector<T> out;
-    out.reserve(v.get_array().size());
-    for (const auto& item : v.get_array()) out.push_back(DecodeNested<T>(name, item));
-    return out;
+    return DecodeList<T>(name, Required(name));
+  }
+  template <typename T>
+  std::optional<std::vector<T>> OptionalList(std::string_view name) {
+    const boost::json::value* v = Optional(name);
+    if (v == nullptr) return std::nullopt;
+    return DecodeList<T>(name, *v);
   }
 
   void Finish() const;
@@ -89,6 +92,14 @@ class ObjectReader {
   const boost::json::value* Optional(std::string_view name);
   const boost::json::string& RequiredString(std::string_view name);
 
+  template <typename T>
+  static std::vector<T> DecodeList(std::string_view name, const boost::json::value& v) {
+    if (!v.is_array()) throw DecodeError(std::string(name), "expected a list");
+    std::vector<T> out;
+    out.reserve(v.get_array().size());
+    for (const auto& item : v.get_array()) out.push_back(DecodeNested<T>(name, item));
+    return out;
+  }
   template <typename T>
   static T DecodeNested(std::string_view name, const boost::json::value& v) {
     try {

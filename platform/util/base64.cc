@@ -47,7 +47,10 @@ bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize,
   return true;
 }
 
-bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out) {
+namespace {
+
+template <typename Bytes>
+bool DecodeStandard(std::string_view text, Bytes* out) {
   out->clear();
   if (text.size() % 4 != 0) return false;
   out->reserve(text.size() / 4 * 3);
@@ -74,16 +77,26 @@ bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out) {
   return true;
 }
 
+}  // namespace
+
+bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out) {
+  return DecodeStandard(text, out);
+}
+
+bool Base64_Decode(std::string_view text, Groundwork::SecureBytes* out) {
+  return DecodeStandard(text, out);
+}
+
 namespace Groundwork {
 namespace {
 
-constexpr char kUrlAlphabet[] =
-    "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_";
+constexpr char kUrlAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_";
 
 constexpr std::array<int8_t, 256> MakeUrlReverse() {
   std::array<int8_t, 256> table{};
   for (auto& v : table) v = -1;
-  for (int i = 0; i < 64; ++i) table[static_cast<uint8_t>(kUrlAlphabet[i])] = static_cast<int8_t>(i);
+  for (int i = 0; i < 64; ++i)
+    table[static_cast<uint8_t>(kUrlAlphabet[i])] = static_cast<int8_t>(i);
   return table;
 }
 

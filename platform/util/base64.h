@@ -7,6 +7,8 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/util/secure_buffer.h"
+
 // Size of the buffer that Base64_Encode needs for `length` input bytes,
 // including the terminating NUL.
 size_t Base64_EncodedLength(const uint8_t* src, size_t length);
@@ -14,12 +16,13 @@ size_t Base64_EncodedLength(const uint8_t* src, size_t length);
 // Encodes `length` bytes of `src` into `dst` (NUL-terminated). Returns false
 // when `dstSize` is too small. `dstLength`, when given, receives the length
 // without the NUL.
-bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize,
-                   size_t* dstLength);
+bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize, size_t* dstLength);
 
 // Decodes standard Base64 text; false on any character outside the alphabet,
 // bad padding or a length that is not a multiple of four.
 bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out);
+// The same into a buffer that wipes itself (for secrets).
+bool Base64_Decode(std::string_view text, Groundwork::SecureBytes* out);
 
 namespace Groundwork {
 
