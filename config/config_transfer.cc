@@ -4,6 +4,8 @@
 
 #include "config/provider_config.h"
 #include "config/store_access.h"
+#include "platform/configstore/export_codec.h"
+#include "platform/configstore/record_types.h"
 #include "platform/ssl/ssl_utils.h"
 
 namespace Zyrd::Config {
@@ -56,6 +58,22 @@ int ImportConfig(const std::string& config) {
     return kStoreError;
   }
   return kStoreOk;
+}
+
+bool CheckImportScope(const std::string& config, std::string& reason) {
+  OrnaConfigStore::Codec::ExportContents contents;
+  std::string ignored;
+  if (!OrnaConfigStore::Codec::DecodeExport(config, contents, ignored)) return true;
+  const ConfigStoreObjectId providers(kProvidersKey, kGroup, kComponent);
+  // The scopes include the id of every object of the text.
+  for (const auto& scope : contents.scopes) {
+    if (!scope.SameScope(providers)) {
+      reason = "it names " + scope.GetKey() + "/" + scope.GetGroup() + "/" + scope.GetComponent() +
+               ", not only the providers";
+      return false;
+    }
+  }
+  return OrnaConfigStore::CheckRecordTypes(contents.objects, reason);
 }
 
 void RestoreConfig() {

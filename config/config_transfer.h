@@ -28,6 +28,13 @@ int ExportConfig(std::string& config, std::string& digest, const DigestFunction&
 // A text the store refuses changes nothing and gives 2.
 int ImportConfig(const std::string& config);
 
+// Whether `config` may replace the providers configuration: false, with the
+// reason, for an export text that covers or holds anything but the providers
+// (another record such as the attestation certificate or "zyrd_config"), or
+// that gives a provider value another type than its record's. A text that
+// is no export at all passes here; ImportConfig refuses it.
+bool CheckImportScope(const std::string& config, std::string& reason);
+
 // Marks every stored provider, and "zyrd_config", as restored for this
 // boot. Called once at start-up, before the endpoint serves; failures are
 // logged and never stop start-up.

@@ -75,7 +75,8 @@ int ListProviderIds(std::vector<std::string>& ids);
 int ListProviders(std::vector<std::shared_ptr<ProvidersSvc::Summary>>& providers);
 // Appends the hostname of each server to `hosts` when `withServers`, and
 // sets `proxyHost` to the proxy's hostname when `withProxy` and the provider
-// has a proxy. Every failure (also a missing provider) gives 2.
+// has a proxy. 3 when the provider or one of its objects is missing; 2 for
+// any other failure.
 int GetProviderHosts(const std::string& name, bool withServers, bool withProxy,
                      std::vector<std::string>& hosts, std::string& proxyHost);
 

@@ -209,7 +209,8 @@ int ListProviders(std::vector<std::shared_ptr<ProvidersSvc::Summary>>& providers
 int GetProviderHosts(const std::string& name, bool withServers, bool withProxy,
                      std::vector<std::string>& hosts, std::string& proxyHost) {
   ProviderConfigObjects objects;
-  if (LoadProviderObjects(name, objects) != kStoreOk) return kStoreError;
+  int rc = LoadProviderObjects(name, objects);
+  if (rc != kStoreOk) return rc;
   ValueReader reader;
   std::vector<std::string> serverHosts;
   std::string proxy;

@@ -67,9 +67,9 @@ class Providers final : public ProviderLookup {
   std::shared_ptr<Kms::Kms> GetProvider(const std::string& name) override;
 
   // Drops one provider's client (after any change to that provider).
-  void DeleteProviderFromState(const std::string& name);
+  void DeleteProviderFromState(const std::string& name) override;
   // Drops every client (stale cache, configuration import).
-  void DeleteAllProvidersFromState();
+  void DeleteAllProvidersFromState() override;
 
   // The scheduled item: refreshes every provider's status, then re-arms.
   void RunStatusUpdate();

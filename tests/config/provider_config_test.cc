@@ -186,7 +186,7 @@ TEST_F(ProviderConfigTest, ListsAndHostsFollowTheStore) {
   ASSERT_EQ(GetProviderHosts("b", false, true, hosts, proxy), kStoreOk);
   EXPECT_TRUE(hosts.empty());
   EXPECT_EQ(proxy, "proxy.example");
-  EXPECT_EQ(GetProviderHosts("nope", true, true, hosts, proxy), kStoreError);
+  EXPECT_EQ(GetProviderHosts("nope", true, true, hosts, proxy), kStoreNotFound);
 
   ASSERT_EQ(DeleteProvider("b"), kStoreOk);
   std::vector<std::string> ids;

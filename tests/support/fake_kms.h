@@ -76,7 +76,17 @@ class FakeProviders : public Zyrd::State::ProviderLookup {
     return it == clients_.end() ? nullptr : it->second;
   }
 
+  void DeleteProviderFromState(const std::string& name) override {
+    clients_.erase(name);
+    dropped.push_back(name);
+  }
+  void DeleteAllProvidersFromState() override {
+    clients_.clear();
+    dropped.push_back("*");
+  }
+
   size_t lookups = 0;
+  std::vector<std::string> dropped;  // names dropped, "*" for all
 
  private:
   std::map<std::string, std::shared_ptr<Zyrd::Kms::Kms>> clients_;
