@@ -16,6 +16,8 @@
 #include "platform/util/panic.h"
 #include "platform/util/paths.h"
 #include "services/key_operation_impl.h"
+#include "services/providers_impl.h"
+#include "services/raw_config_impl.h"
 #include "services/status_impl.h"
 
 namespace Zyrd::ZyrApi {
@@ -98,7 +100,8 @@ Lumo::Provider::ApiProviderPtr CreateLocalProvider(Lumo::Executor executor,
       "Loading authn metadata file: %s\n", path, "zyr_lumo_authentication",
       Metadata::ProviderHelper::LoadAuthnMetadataFile);
   auto authzInfo = LoadAuthzOrStop(path, logger);
-  VERIFY(deps.providers != nullptr && deps.clock != nullptr && deps.stats != nullptr);
+  VERIFY(deps.providers != nullptr && deps.firewall != nullptr && deps.clock != nullptr &&
+         deps.stats != nullptr);
 
   // The daemon's services, in binding order. Services without an
   // implementation in this build are described by the metadata but not bound;
@@ -106,6 +109,10 @@ Lumo::Provider::ApiProviderPtr CreateLocalProvider(Lumo::Executor executor,
   std::vector<Lumo::Provider::ApiInterfacePtr> interfaces = {
       Kms::KeyOperationSvc::AsyncServiceBinder::BindImplementation(
           std::make_shared<Kms::KeyOperationSvc::KeyOperationImpl>(deps.providers, *deps.stats)),
+      Kms::ProvidersSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<Kms::ProvidersSvc::ProvidersImpl>(deps.providers, *deps.firewall)),
+      Kms::RawConfigSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<Kms::RawConfigSvc::RawConfigImpl>(deps.providers)),
       Kms::StatusSvc::AsyncServiceBinder::BindImplementation(
           std::make_shared<Kms::StatusSvc::StatusImpl>()),
   };

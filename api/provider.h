@@ -16,6 +16,7 @@
 #include "daemon/stats.h"
 #include "platform/lumo/provider.h"
 #include "platform/util/hostinfo.h"
+#include "state/firewall.h"
 #include "state/provider_lookup.h"
 
 namespace Zyrd::ZyrApi {
@@ -26,6 +27,9 @@ inline constexpr const char* kMetadataPath = "/usr/lib/tarsel/lumo/zyr_lumo_meta
 struct ProviderDependencies {
   // Each provider's key server client.
   std::shared_ptr<State::ProviderLookup> providers;
+  // The firewall ruleset kept in step with the providers; must outlive the
+  // provider.
+  State::Firewall* firewall = &State::GlobalFirewall();
   // vouchd's public key (PEM) for attestation tokens; false when unavailable.
   std::function<bool(std::string& key)> readVouchdPublicKey;
   // Full paths; the daemon's are under the root (Groundwork::RootPath).

@@ -26,6 +26,7 @@
 #include "platform/util/log.h"
 #include "platform/util/paths.h"
 #include "platform/util/ssl_init.h"
+#include "state/firewall.h"
 #include "state/global_providers.h"
 
 namespace Zyrd {
@@ -72,6 +73,7 @@ void ExitDaemon(int status, ZyrApi::Endpoint* endpoint) {
   Log_Level(3, "Exiting with status %d\n", status);
   Kestrel::Common::SignalUtils::SignalsExit();
   if (endpoint != nullptr) endpoint->Stop();
+  State::GlobalFirewall().CloseAll();
   SSL_Exit();
   Strake::System::QuickExit(status);
 }
@@ -91,6 +93,7 @@ void RunDaemon() {
     auto loggerWrapper = std::make_shared<ZyrApi::LumoLoggerWrapper>(&Log_Level);
 
     Config::RestoreConfig();
+    State::GlobalFirewall().OpenAll();
 
     auto localizer = std::make_shared<const Lumo::L10n::Localizer>(
         std::vector<std::string>{"en_US"}, ZyrApi::ResolveMessage);
