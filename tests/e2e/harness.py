@@ -201,6 +201,51 @@ def mint(key_path, *args):
     return done.stdout.decode().strip()
 
 
+def admin_token(daemon, root):
+    # The host admin token, which the daemon creates at its first start.
+    daemon.http_port()  # start-up has passed the token handler
+    return (pathlib.Path(root) / "var/lib/zyrd/admin.token").read_text().strip()
+
+
+def audited_call(root, client, method, params, token):
+    # client.call, checking that the call wrote exactly one audit record with
+    # the right success flag and a fresh operation id.
+    before = len(audit_records(root))
+    name, response = client.call(method, params, token)
+    records = audit_records(root, before + 1)
+    assert len(records) == before + 1 and records[-1]["eventId"] == "api.call"
+    assert records[-1]["success"] is (name is None), (records[-1], response)
+    assert records[-1]["opId"] not in [r["opId"] for r in records[:-1]]
+    return name, response
+
+
+def first_message(response):
+    return response["result"]["error"]["messages"][0]
+
+
+def cfgvault(root, *args, stdin=None):
+    # Runs cfgvault on the root's store; returns the completed process.
+    return subprocess.run([str(BUILD_DIR / "cfgvault"), *args], input=stdin,
+                          capture_output=True, timeout=30,
+                          env={**os.environ, "ZYRD_ROOT": str(root)})
+
+
+def add_trust_material(root, provider, kmip):
+    # Stores, beside what the provider has, the KMIP server's CA as trusted
+    # and the test client certificate and key (until the API can do it).
+    text = json.loads(cfgvault(root, "export", "providers", "kms", "orna").stdout)
+    record = next(o for o in text["objects"] if o["instance"] == provider)
+    key_server = record["subObjects"][0]
+    key_server["values"]["server_cert"] = [kmip.pem("ca")]
+    kmip_server = next(s for s in key_server["subObjects"] if s["name"] == "kmip_server")
+    kmip_server["subObjects"].append({
+        "name": "client_certificate", "instance": "", "subObjects": [],
+        "values": {"certificate": kmip.pem("client"),
+                   "private_key": kmip.key_path("client").read_text()}})
+    done = cfgvault(root, "import", "-", stdin=json.dumps(text).encode())
+    assert done.returncode == 0, done.stderr
+
+
 def audit_records(root, at_least=0, timeout=5.0):
     # The audit records so far; waits until there are `at_least` of them
     # (a call's record is written as it completes, around its response).

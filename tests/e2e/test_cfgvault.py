@@ -54,7 +54,8 @@ def test_malformed_import_exits_non_zero_and_changes_nothing(tmp_path):
     cfgvault(db, "import", "-", stdin=export_text(PROVIDER))
     before = export(db).stdout
     for text in [b"", b"{", b'{"format":"orna-configstore-export","version":9,"objects":[]}',
-                 export_text(dict(PROVIDER, values={"port": 1.5}))]:
+                 export_text(dict(PROVIDER, values={"port": 1.5})),
+                 export_text(dict(PROVIDER, values={"provider": "p1", "master_key_id": 7}))]:
         result = cfgvault(db, "import", "-", stdin=text)
         assert result.returncode == 1
         assert result.stderr.decode().startswith("cfgvault: import refused: ")

@@ -11,8 +11,8 @@ import types
 import jwt
 import pytest
 
-from harness import (Client, Daemon, audit_records, free_port, make_attestation_key, mint, seed,
-                     write_config)
+from harness import (Client, Daemon, audit_records, audited_call, first_message, free_port,
+                     make_attestation_key, mint, seed, write_config)
 
 KEY_OPS = "com.tarsel.orna.kms.key_operation."
 ERRORS = "com.tarsel.lumo.std.errors."
@@ -47,21 +47,12 @@ def env(kmip_server, tmp_path_factory, request):
 def call(env, method, params, token=None):
     # (lumo-error header or None, response) of a call with the attestation
     # token unless another (or "" for none) is given.
-    before = len(audit_records(env.root))
-    name, response = env.client.call(method, params, env.token if token is None else token)
-    records = audit_records(env.root, before + 1)
-    assert len(records) == before + 1 and records[-1]["eventId"] == "api.call"
-    assert records[-1]["success"] is (name is None), (records[-1], response)
-    assert records[-1]["opId"] not in [r["opId"] for r in records[:-1]]
-    return name, response
+    return audited_call(env.root, env.client, method, params,
+                        env.token if token is None else token)
 
 
 def generate(env, provider, size=32, token=None):
     return call(env, KEY_OPS + "generate_key", {"provider": provider, "keySize": size}, token)
-
-
-def message(response):
-    return response["result"]["error"]["messages"][0]
 
 
 def test_generate_then_decrypt_gives_the_same_key(env):
@@ -90,8 +81,8 @@ def test_deactivated_master_key_decrypts_but_does_not_encrypt(env):
     env.kmip.admin(("revoke", env.deact, "deactivated"))
     name, response = generate(env, "deact")
     assert name == ERRORS + "error"
-    assert message(response)["id"] == "com.tarsel.orna.kms.master_key_unusable_for_encryption"
-    assert message(response)["args"]["server"] == "live"
+    assert first_message(response)["id"] == "com.tarsel.orna.kms.master_key_unusable_for_encryption"
+    assert first_message(response)["args"]["server"] == "live"
     name, response = call(env, KEY_OPS + "decrypt", {"provider": "deact", "wrappedKey": wrapped})
     assert name is None, response
 
@@ -103,7 +94,7 @@ def test_argument_and_lookup_errors(env):
             ("p1", 0, "invalid_argument", {"parameter": "keySize"}),
             ("p1", 65536, "invalid_argument", {"parameter": "keySize"})]:
         name, response = generate(env, provider, size)
-        assert (name, message(response)["args"]) == (ERRORS + error, args), response
+        assert (name, first_message(response)["args"]) == (ERRORS + error, args), response
     name, response = call(env, KEY_OPS + "encrypt", {"provider": "p1", "plaintext": "AA=="})
     assert name == ERRORS + "error" and response["result"]["error"]["messages"] == []
 
