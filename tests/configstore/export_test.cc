@@ -110,4 +110,22 @@ TEST_F(ExportTest, RefusedTextsChangeNothingAndSayWhy) {
             "objects[0].values.port: a value is a string, an integer or a list of strings");
 }
 
+TEST_F(ExportTest, KnownProviderValuesMustHaveTheirTypes) {
+  auto provider = [](const std::string& values, const std::string& server) {
+    return kHead + R"("objects":[)" + kObj + R"(,"values":{"provider":"p9")" + values +
+           R"(},"subObjects":[{"name":"key_server","instance":"","subObjects":[)"
+           R"({"name":"kmip_server","instance":"","subObjects":[)"
+           R"({"name":"servers","instance":"s","values":)" +
+           server + "}]}]}]}]}";
+  };
+  EXPECT_FALSE(Import(provider(R"(,"master_key_id":7)", "{}")));
+  EXPECT_EQ(errors_[0].message, "providers/kms/orna/p9: \"master_key_id\" must be a string");
+  EXPECT_FALSE(Import(provider("", R"({"port":"5696"})")));
+  EXPECT_EQ(errors_[0].message,
+            "providers/kms/orna/p9/key_server/kmip_server/servers[s]: \"port\" must be an integer");
+  EXPECT_TRUE(Store().GetObjectsByFilter(ProvidersFilter()).empty());
+  // Values the layout does not name are not checked.
+  EXPECT_TRUE(Import(provider(R"(,"note":["x"])", R"({"port":5696,"weight":"high"})")));
+}
+
 }  // namespace

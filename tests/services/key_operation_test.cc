@@ -1,13 +1,11 @@
 #include <gtest/gtest.h>
 
-#include <boost/json/serialize.hpp>
-#include <optional>
-
 #include "services/key_operation_impl.h"
 #include "services/status_impl.h"
 #include "tests/support/fake_kms.h"
 #include "tests/support/fakes.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/service_calls.h"
 
 namespace {
 
@@ -16,29 +14,10 @@ using Com::Tarsel::Orna::Kms::KeyOperationSvc::EncryptResult;
 using Com::Tarsel::Orna::Kms::KeyOperationSvc::GeneratedKey;
 using Com::Tarsel::Orna::Kms::KeyOperationSvc::KeyOperationImpl;
 using Lumo::Core::MethodResult;
+using ZyrdTest::Describe;
 using ZyrdTest::FakeKms;
+using ZyrdTest::RunOp;
 using namespace Zyrd::Kms;
-
-// Runs one operation and returns how it completed.
-template <typename T, typename Fn>
-MethodResult RunOp(Fn fn) {
-  std::optional<MethodResult> out;
-  fn(Lumo::AsyncResult<T>(
-      Lumo::Core::Completion(nullptr, [&](MethodResult r) { out = std::move(r); })));
-  EXPECT_TRUE(out.has_value());
-  return out ? std::move(*out) : MethodResult::InvalidParams("not completed");
-}
-
-// "<error name> <message id> <arg>=<value>..." of an error result.
-std::string Describe(const MethodResult& r) {
-  if (r.IsOutput()) return "output " + boost::json::serialize(r.output);
-  std::string out = r.error->Name();
-  for (const auto& m : r.error->Messages()) {
-    out += " " + m.id;
-    for (const auto& a : m.args) out += " " + a.name + "=" + a.value;
-  }
-  return out;
-}
 
 class KeyOperationTest : public ::testing::Test {
  protected:

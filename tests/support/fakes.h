@@ -1,4 +1,4 @@
-// Deterministic stand-ins for the clock and the scheduler.
+// Deterministic stand-ins for the clock, the scheduler and the host firewall.
 #pragma once
 
 #include <atomic>
@@ -6,10 +6,13 @@
 #include <functional>
 #include <memory>
 #include <mutex>
+#include <set>
+#include <string>
 #include <vector>
 
 #include "platform/runtime/scheduler.h"
 #include "platform/util/hostinfo.h"
+#include "state/firewall.h"
 
 namespace ZyrdTest {
 
@@ -70,6 +73,19 @@ class ManualScheduler : public Strake::System::Scheduler {
  private:
   mutable std::mutex mutex_;
   std::vector<Item> items_;
+};
+
+// Records each ruleset change as "+host" or "-host"; the calls whose
+// 1-based numbers are in `failOn` fail (and are recorded all the same).
+class RecordingFirewall : public Zyrd::State::HostFirewall {
+ public:
+  bool AddOrRemoveServer(const std::string&, bool allow, const std::string& host) override {
+    calls.push_back((allow ? "+" : "-") + host);
+    return failOn.count(calls.size()) == 0;
+  }
+
+  std::vector<std::string> calls;
+  std::set<size_t> failOn;
 };
 
 }  // namespace ZyrdTest
