@@ -11,6 +11,7 @@ import subprocess
 import sys
 import tempfile
 import time
+import types
 
 BUILD_DIR = pathlib.Path(os.environ.get("ZYRD_BUILD_DIR", "build")).resolve()
 SOURCE_DIR = pathlib.Path(__file__).resolve().parents[2]
@@ -199,6 +200,18 @@ def mint(key_path, *args):
     done = subprocess.run([str(TOOLS / "mint-attestation-token"), "--key", str(key_path), *args],
                           check=True, stdout=subprocess.PIPE)
     return done.stdout.decode().strip()
+
+
+def start_seeded(root, spec, request):
+    # A daemon logging verbose detail over a store seeded with spec (see
+    # seed), killed at the end of the pytest request; with a client and the
+    # admin token.
+    seed(root, spec)
+    write_config(root, "<log><level>verbose</level></log>")
+    daemon = Daemon(root)
+    request.addfinalizer(daemon.kill)
+    return types.SimpleNamespace(root=root, daemon=daemon, client=Client(daemon.http_port()),
+                                 admin=admin_token(daemon, root))
 
 
 def admin_token(daemon, root):

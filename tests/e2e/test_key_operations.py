@@ -6,13 +6,12 @@ import hashlib
 import hmac
 import json
 import time
-import types
 
 import jwt
 import pytest
 
-from harness import (Client, Daemon, audit_records, audited_call, first_message, free_port,
-                     make_attestation_key, mint, seed, write_config)
+from harness import (audit_records, audited_call, first_message, free_port, make_attestation_key,
+                     mint, start_seeded)
 
 KEY_OPS = "com.tarsel.orna.kms.key_operation."
 ERRORS = "com.tarsel.lumo.std.errors."
@@ -33,15 +32,13 @@ def env(kmip_server, tmp_path_factory, request):
                 "clientPrivateKey": kmip_server.key_path("client").read_text()}
 
     live = ("live", kmip_server.port)
-    seed(root, {"providers": [provider("p1", active, [live]),
-                              provider("failover", active, [("dead", free_port()), live]),
-                              provider("deact", deact, [live])],
-                "attestationCertificate": cert})
-    write_config(root, "<log><level>verbose</level></log>")
-    daemon = Daemon(root)
-    request.addfinalizer(daemon.kill)
-    return types.SimpleNamespace(root=root, daemon=daemon, client=Client(daemon.http_port()),
-                                 key=key_path, token=mint(key_path), kmip=kmip_server, deact=deact)
+    env = start_seeded(root, {"providers": [provider("p1", active, [live]),
+                                            provider("failover", active,
+                                                     [("dead", free_port()), live]),
+                                            provider("deact", deact, [live])],
+                              "attestationCertificate": cert}, request)
+    env.__dict__.update(key=key_path, token=mint(key_path), kmip=kmip_server, deact=deact)
+    return env
 
 
 def call(env, method, params, token=None):

@@ -3,12 +3,11 @@
 # provider made this way, and the firewall ruleset that follows them.
 
 import copy
-import types
 
 import pytest
 
-from harness import (Client, Daemon, admin_token, add_trust_material, audited_call, first_message,
-                     free_port, make_attestation_key, mint, seed, write_config)
+from harness import (add_trust_material, audited_call, first_message, free_port,
+                     make_attestation_key, mint, seed, start_seeded, write_config)
 
 PROVIDERS = "com.tarsel.orna.kms.providers."
 GENERATE = "com.tarsel.orna.kms.key_operation.generate_key"
@@ -18,15 +17,11 @@ RULESET = "var/lib/zyrd/firewall/ironvale-zyrd"
 
 @pytest.fixture(scope="module")
 def env(kmip_server, tmp_path_factory, request):
-    root = tmp_path_factory.mktemp("root")
     key_path, cert = make_attestation_key(tmp_path_factory.mktemp("attest"))
-    seed(root, {"attestationCertificate": cert})
-    write_config(root, "<log><level>verbose</level></log>")
-    daemon = Daemon(root)
-    request.addfinalizer(daemon.kill)
-    return types.SimpleNamespace(root=root, daemon=daemon, client=Client(daemon.http_port()),
-                                 admin=admin_token(daemon, root), token=mint(key_path),
-                                 kmip=kmip_server, master=kmip_server.create_key(256))
+    env = start_seeded(tmp_path_factory.mktemp("root"), {"attestationCertificate": cert}, request)
+    env.__dict__.update(token=mint(key_path), kmip=kmip_server,
+                        master=kmip_server.create_key(256))
+    return env
 
 
 def call(env, operation, params, token=None):

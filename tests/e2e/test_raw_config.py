@@ -10,20 +10,11 @@ import zlib
 
 import pytest
 
-from harness import (Client, Daemon, admin_token, add_trust_material, audited_call, first_message,
-                     make_attestation_key, mint, seed, write_config)
+from harness import (add_trust_material, audited_call, first_message, make_attestation_key, mint,
+                     start_seeded)
 
 RAW = "com.tarsel.orna.kms.raw_config."
 ERRORS = "com.tarsel.lumo.std.errors."
-
-
-def start(root, cert, request):
-    seed(root, {"attestationCertificate": cert})
-    write_config(root, "<log><level>verbose</level></log>")
-    daemon = Daemon(root)
-    request.addfinalizer(daemon.kill)
-    return types.SimpleNamespace(root=root, daemon=daemon, client=Client(daemon.http_port()),
-                                 admin=admin_token(daemon, root))
 
 
 @pytest.fixture(scope="module")
@@ -31,8 +22,8 @@ def env(kmip_server, tmp_path_factory, request):
     # Daemon a holds a working provider made over the API; daemon b starts
     # with another provider of its own.
     key_path, cert = make_attestation_key(tmp_path_factory.mktemp("attest"))
-    a = start(tmp_path_factory.mktemp("a"), cert, request)
-    b = start(tmp_path_factory.mktemp("b"), cert, request)
+    a = start_seeded(tmp_path_factory.mktemp("a"), {"attestationCertificate": cert}, request)
+    b = start_seeded(tmp_path_factory.mktemp("b"), {"attestationCertificate": cert}, request)
     servers = [{"name": "live", "address": {"hostname": "127.0.0.1", "port": kmip_server.port}}]
     master = kmip_server.create_key(256)
     for d, provider in ((a, "exported"), (b, "local")):
