@@ -1,11 +1,14 @@
 // Feeds arbitrary bytes as the body of an HTTP call to the JSON-RPC handler
 // over the fully assembled API provider (with an admin token, so inputs reach
-// the services' decoders). Every body must get exactly one answer.
+// the services' decoders and the management services run). The store is a
+// scratch database and the firewall a stand-in that accepts every change.
+// Every body must get exactly one answer.
 #include <stdlib.h>
 
 #include <cstdint>
 
 #include "platform/audit/audit.h"
+#include "platform/configstore/sqlite_store.h"
 #include "tests/support/api_chain.h"
 #include "tests/support/fake_kms.h"
 
@@ -16,15 +19,26 @@ class NullAuditSink : public Tsl::Audit::AuditSink {
   bool Write(std::string_view) override { return true; }
 };
 
+class AcceptingFirewall : public Zyrd::State::HostFirewall {
+ public:
+  bool AddOrRemoveServer(const std::string&, bool, const std::string&) override { return true; }
+};
+
 Zyrd::ZyrApi::ProviderDependencies Dependencies() {
   Groundwork::SetLogThreshold(Groundwork::kLogOff);
   static NullAuditSink sink;
   Tsl::Audit::SetAuditSink(&sink);
+  static ZyrdTest::TempDir storeDir;
+  OrnaConfigStore::ConfigStore::SetGlobalStore(
+      OrnaConfigStore::SqliteConfigStore::Open(storeDir / "configstore.db"));
+  static AcceptingFirewall host;
+  static Zyrd::State::Firewall firewall(host);
   auto providers = std::make_shared<ZyrdTest::FakeProviders>();
   providers->Add("p1", std::make_shared<ZyrdTest::FakeKms>(std::vector<ZyrdTest::FakeKms::Server>{
                            {"s1", Zyrd::Kms::KeyServerTimeout}, {"s2"}}));
   Zyrd::ZyrApi::ProviderDependencies deps;
   deps.providers = providers;
+  deps.firewall = &firewall;
   deps.readVouchdPublicKey = [](std::string&) { return false; };
   return deps;
 }
