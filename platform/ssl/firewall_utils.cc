@@ -5,6 +5,7 @@
 
 #include <fstream>
 #include <mutex>
+#include <set>
 
 #include "platform/util/files.h"
 #include "platform/util/log.h"
@@ -48,12 +49,6 @@ bool IsValidHostname(std::string_view hostname) {
     if (c <= ' ' || c > '~') return false;  // also every byte of 0x80 and above
   }
   return true;
-}
-
-bool ReadRuleset(const std::string& ruleset, std::set<std::string>& hosts) {
-  if (!IsValidRulesetName(ruleset)) return false;
-  std::lock_guard<std::mutex> lock(gMutex);
-  return ReadHosts(RulesetPath(ruleset), hosts);
 }
 
 bool AddOrRemoveServer(const std::string& ruleset, bool allow, const std::string& hostname) {

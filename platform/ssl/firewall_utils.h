@@ -9,7 +9,6 @@
 // process; the functions are thread-safe.
 #pragma once
 
-#include <set>
 #include <string>
 #include <string_view>
 
@@ -24,10 +23,6 @@ inline constexpr std::string_view kRulesetDirectory = "/var/lib/zyrd/firewall";
 // plain file name, and for a host name that is empty or holds a byte outside
 // printable ASCII or a blank: such a name could not be one line of the file.
 bool AddOrRemoveServer(const std::string& ruleset, bool allow, const std::string& hostname);
-
-// The hosts `ruleset` allows now (empty when its file does not exist).
-// False when the file exists but cannot be read.
-bool ReadRuleset(const std::string& ruleset, std::set<std::string>& hosts);
 
 // Whether `hostname` can be kept in a ruleset.
 bool IsValidHostname(std::string_view hostname);

@@ -79,6 +79,20 @@ TEST_F(ProvidersServiceTest, AFailedUpdateRestoresTheFirewallAndKeepsTheClient) 
   EXPECT_TRUE(providers_->dropped.empty());
 }
 
+TEST_F(ProvidersServiceTest, AMasterKeyChangeKeepsHostsAndServersAndDropsTheClient) {
+  ASSERT_EQ(Create(Spec("p", {"a"})), "output null");
+  host_.calls.clear();
+  Svc::UpdateSpec newKey;
+  newKey.masterKeyId = "mk2";
+  EXPECT_EQ(Update("p", newKey), "output null");
+  EXPECT_TRUE(host_.calls.empty());
+  EXPECT_EQ(providers_->dropped, Strings{"p"});
+  Strings hosts;
+  std::string proxy;
+  ASSERT_EQ(Zyrd::Config::GetProviderHosts("p", true, true, hosts, proxy), 0);
+  EXPECT_EQ(hosts, Strings{"a"});
+}
+
 class RawConfigServiceTest : public ProvidersServiceTest {
  protected:
   std::string Set(const std::string& text) {
