@@ -4,6 +4,7 @@
 // scratch database and the firewall a stand-in that accepts every change.
 // Every body must get exactly one answer.
 #include <stdlib.h>
+#include <unistd.h>
 
 #include <cstdint>
 
@@ -19,6 +20,20 @@ class NullAuditSink : public Tsl::Audit::AuditSink {
   bool Write(std::string_view) override { return true; }
 };
 
+std::shared_ptr<OrnaConfigStore::ConfigStore>& Store() {
+  static std::shared_ptr<OrnaConfigStore::ConfigStore> store;
+  return store;
+}
+
+// Every input starts from a store without providers, so that inputs do not
+// depend on each other and the store does not grow.
+void ClearProviders() {
+  std::vector<OrnaConfigStore::ErrorInfo> errors;
+  Store()->Import(R"({"format":"orna-configstore-export","version":1,)"
+                  R"("scope":[{"key":"providers","group":"kms","component":"orna"}],"objects":[]})",
+                  errors);
+}
+
 class AcceptingFirewall : public Zyrd::State::HostFirewall {
  public:
   bool AddOrRemoveServer(const std::string&, bool, const std::string&) override { return true; }
@@ -28,9 +43,11 @@ Zyrd::ZyrApi::ProviderDependencies Dependencies() {
   Groundwork::SetLogThreshold(Groundwork::kLogOff);
   static NullAuditSink sink;
   Tsl::Audit::SetAuditSink(&sink);
+  // On tmpfs, where flushing to disk costs nothing, when there is one.
+  if (access("/dev/shm", W_OK) == 0) setenv("TMPDIR", "/dev/shm", 1);
   static ZyrdTest::TempDir storeDir;
-  OrnaConfigStore::ConfigStore::SetGlobalStore(
-      OrnaConfigStore::SqliteConfigStore::Open(storeDir / "configstore.db"));
+  Store() = OrnaConfigStore::SqliteConfigStore::Open(storeDir / "configstore.db");
+  OrnaConfigStore::ConfigStore::SetGlobalStore(Store());
   static AcceptingFirewall host;
   static Zyrd::State::Firewall firewall(host);
   auto providers = std::make_shared<ZyrdTest::FakeProviders>();
@@ -47,6 +64,7 @@ Zyrd::ZyrApi::ProviderDependencies Dependencies() {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   static ZyrdTest::ApiChain chain(Dependencies());
+  ClearProviders();
   auto call = std::make_shared<Lumo::Transport::HttpCall>();
   call->body.assign(reinterpret_cast<const char*>(data), size);
   call->authorization = "Bearer " + chain.AdminToken();
