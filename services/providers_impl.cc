@@ -141,6 +141,32 @@ int SetNewProvider(Config::ProviderConfigObjects& objects, const CreateSpec& spe
   return rc;
 }
 
+// Sets what an update gives for the key server on the provider's objects,
+// stopping at the first failure; the hosts it brings in go to `newHosts`.
+// The stored type is never rewritten.
+int SetKeyServerChanges(Config::ProviderConfigObjects& objects, const KeyServerUpdateSpec& ks,
+                        std::vector<std::string>& newHosts) {
+  int rc = Config::kStoreOk;
+  if (ks.description) rc = Config::SetDescription(objects, *ks.description);
+  if (rc == Config::kStoreOk && ks.connectionTimeout) {
+    rc = Config::SetConnectionTimeout(objects, *ks.connectionTimeout);
+  }
+  if (rc == Config::kStoreOk && ks.proxyServer) {
+    const NetworkAddress& proxy = *ks.proxyServer;
+    rc = Config::SetProxy(objects, proxy.hostname, proxy.port.value_or(kDefaultProxyPort));
+    if (rc == Config::kStoreOk && !proxy.hostname.empty()) newHosts.push_back(proxy.hostname);
+  }
+  if (!ks.kmipServer) return rc;
+  if (rc == Config::kStoreOk && ks.kmipServer->username) {
+    rc = Config::SetUserName(objects, *ks.kmipServer->username);
+  }
+  if (rc == Config::kStoreOk && ks.kmipServer->servers) {
+    rc = Config::DeleteAllServers(objects);
+    if (rc == Config::kStoreOk) rc = AddServers(objects, *ks.kmipServer->servers, newHosts);
+  }
+  return rc;
+}
+
 }  // namespace
 
 ProvidersImpl::ProvidersImpl(std::shared_ptr<Zyrd::State::ProviderLookup> providers,
@@ -221,47 +247,23 @@ void ProvidersImpl::update(const std::string& provider, const UpdateSpec& spec,
   Config::ProviderConfigObjects objects;
   int rc = Config::GetProviderObjects(provider, objects);
   if (rc != Config::kStoreOk) return fail(rc);
-  if (spec.masterKeyId && (rc = Config::SetMasterKeyId(objects, *spec.masterKeyId))) {
-    return fail(rc);
-  }
+  if (spec.masterKeyId) rc = Config::SetMasterKeyId(objects, *spec.masterKeyId);
+  if (rc != Config::kStoreOk) return fail(rc);
 
   std::vector<std::string> oldHosts;
   std::vector<std::string> newHosts;
   if (spec.keyServer) {
     const KeyServerUpdateSpec& ks = *spec.keyServer;
-    const bool replaceServers = ks.kmipServer && ks.kmipServer->servers;
     std::string oldProxy;
-    rc = Config::GetProviderHosts(provider, replaceServers, ks.proxyServer.has_value(), oldHosts,
-                                  oldProxy);
+    rc = Config::GetProviderHosts(provider, ks.kmipServer && ks.kmipServer->servers,
+                                  ks.proxyServer.has_value(), oldHosts, oldProxy);
     if (rc != Config::kStoreOk) {
       Log_Level(2, "Update provider %s failed to get ips to update firewall\n", provider.c_str());
       return result.SetError(StoreError(rc, provider));
     }
     if (!oldProxy.empty()) oldHosts.push_back(oldProxy);
-
-    if (ks.description && (rc = Config::SetDescription(objects, *ks.description))) return fail(rc);
-    if (ks.connectionTimeout &&
-        (rc = Config::SetConnectionTimeout(objects, *ks.connectionTimeout))) {
-      return fail(rc);
-    }
-    if (ks.proxyServer) {
-      const NetworkAddress& proxy = *ks.proxyServer;
-      rc = Config::SetProxy(objects, proxy.hostname, proxy.port.value_or(kDefaultProxyPort));
-      if (rc != Config::kStoreOk) return fail(rc);
-      if (!proxy.hostname.empty()) newHosts.push_back(proxy.hostname);
-    }
-    if (ks.kmipServer) {
-      if (ks.kmipServer->username &&
-          (rc = Config::SetUserName(objects, *ks.kmipServer->username))) {
-        return fail(rc);
-      }
-      if (replaceServers) {
-        if ((rc = Config::DeleteAllServers(objects)) ||
-            (rc = AddServers(objects, *ks.kmipServer->servers, newHosts))) {
-          return fail(rc);
-        }
-      }
-    }
+    rc = SetKeyServerChanges(objects, ks, newHosts);
+    if (rc != Config::kStoreOk) return fail(rc);
   }
 
   const bool firewallChanged = !oldHosts.empty() || !newHosts.empty();
