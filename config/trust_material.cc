@@ -38,6 +38,18 @@ int Commit(const ConfigStoreObjectPtr& object, const char* failureFormat) {
 constexpr const char* kCsrLookupFailed =
     "Unable to find provider or kmip server config for %s: %d\n";
 
+// Runs `read`, which reads values named `what` and returns a status; a value
+// of another type than asked for is logged and gives 2.
+template <typename Read>
+int CatchingReadErrors(const char* what, Read read) {
+  try {
+    return read();
+  } catch (const ConfigStoreException& e) {
+    ZYRD_LOG_STORE_EXCEPTION(e, "Exception reading %s from config store: %s\n", what, e.what());
+    return kStoreError;
+  }
+}
+
 }  // namespace
 
 int GetCredential(const std::string& provider, std::string& credential) {
@@ -79,16 +91,19 @@ int GetClientCertificate(const std::string& provider, std::string& certificate,
     certificate.clear();
     return kStoreOk;
   }
-  if (!clientCert->GetValue("certificate", &certificate)) {
-    Log_Level(2, "Error reading client certificate from config store for provider %s\n",
-              provider.c_str());
-    return kStoreError;
-  }
-  if (!clientCert->GetValue("private_key", &privateKey)) {
-    Log_Level(2, "Error reading private key from config store for provider %s\n", provider.c_str());
-    return kStoreError;
-  }
-  return kStoreOk;
+  return CatchingReadErrors("client certificate", [&] {
+    if (!clientCert->GetValue("certificate", &certificate)) {
+      Log_Level(2, "Error reading client certificate from config store for provider %s\n",
+                provider.c_str());
+      return kStoreError;
+    }
+    if (!clientCert->GetValue("private_key", &privateKey)) {
+      Log_Level(2, "Error reading private key from config store for provider %s\n",
+                provider.c_str());
+      return kStoreError;
+    }
+    return kStoreOk;
+  });
 }
 
 int SetClientCertificate(const std::string& provider, const std::string& certificate,
@@ -129,9 +144,11 @@ int GetClientCsr(const std::string& provider, std::string& csr, std::string& pri
     Log_Level(6, "Client CSR for %s provider not found\n", provider.c_str());
     return kStoreOk;
   }
-  clientCsr->GetValue("certificate", &csr);
-  clientCsr->GetValue("private_key", &privateKey);
-  return kStoreOk;
+  return CatchingReadErrors("client CSR", [&] {
+    clientCsr->GetValue("certificate", &csr);
+    clientCsr->GetValue("private_key", &privateKey);
+    return kStoreOk;
+  });
 }
 
 int SetClientCsr(const std::string& provider, const std::string& csr,
@@ -165,13 +182,15 @@ int GetServerCertificates(const std::string& provider, std::vector<std::string>&
   StoreObjectPtr keyServer;
   int rc = GetKeyServerObject(provider, object, keyServer);
   if (rc != kStoreOk) return rc;
-  std::vector<std::string> stored;
-  if (keyServer->GetValue("server_cert", &stored)) {
-    certificates.insert(certificates.end(), stored.begin(), stored.end());
-    Log_Level(6, "%lu certificates found in configstore\n",
-              static_cast<unsigned long>(stored.size()));
-  }
-  return kStoreOk;
+  return CatchingReadErrors("server_cert", [&] {
+    std::vector<std::string> stored;
+    if (keyServer->GetValue("server_cert", &stored)) {
+      certificates.insert(certificates.end(), stored.begin(), stored.end());
+      Log_Level(6, "%lu certificates found in configstore\n",
+                static_cast<unsigned long>(stored.size()));
+    }
+    return kStoreOk;
+  });
 }
 
 int SetServerCertificates(const std::string& provider,

@@ -9,13 +9,9 @@
 // store status codes: 0 success, 2 store failure or missing value, 3 the
 // provider, its "key_server" or its "kmip_server" does not exist.
 //
-// Exception boundaries: GetCredential, GetClientCsr and SetClientCsr catch
-// the store's ConfigStoreException; SetCredential, SetClientCertificate and
-// SetServerCertificates catch the host-control exception class around their
-// commit. GetClientCertificate and GetServerCertificates catch nothing: a
-// store exception while reading a value (a value of another type) reaches
-// their caller. No function takes "configLock"; callers that change
-// material hold it for write.
+// No function throws: a store exception, also a stored value of another
+// type than the record's, is logged and gives 2. No function takes
+// "configLock"; callers that change material hold it for write.
 #pragma once
 
 #include <string>

@@ -17,10 +17,9 @@
 
 #include "kms/kms.h"
 #include "kms/kms_info.h"
+#include "platform/kmip/qlkmipsimple.h"
 #include "platform/util/secure_buffer.h"
 #include "platform/util/userlock.h"
-
-#include "platform/kmip/qlkmipsimple.h"
 
 namespace Zyrd::Kms {
 
@@ -91,17 +90,20 @@ class KmipKms final : public Kms {
   // The KMIP versions server `server` announces. With `alwaysTrustServer`, a
   // server that the configured certificates do not vouch for is retried
   // trusting `remoteCert` alone.
-  KmsResult DiscoverVersions(uint32_t server, bool alwaysTrustServer,
-                             const std::string& remoteCert, std::string& reason,
-                             std::vector<std::string>& versions);
+  KmsResult DiscoverVersions(uint32_t server, bool alwaysTrustServer, const std::string& remoteCert,
+                             std::string& reason, std::vector<std::string>& versions);
 
   // The certificate server `server` presents, fetched without trusting it.
+  // Like every operation that takes a server index, OtherFailure for an
+  // index beyond the configured servers.
   KmsResult FetchServerCertificate(uint32_t server, std::string& pem, std::string& reason);
 
  private:
   struct ProbeResult;
 
   const std::string& ServerName(uint32_t server) const;
+  // Whether `server` indexes a configured server; when not, `reason` says so.
+  bool HasServer(uint32_t server, std::string& reason) const;
   KmsResult Connect(qlc_session*& session, uint32_t server, std::string& reason);
   KmsResult Perform(qlc_session* session, const std::string& keyId, const char* command,
                     std::string& reason, qlc_result** out);

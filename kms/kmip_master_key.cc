@@ -52,8 +52,7 @@ KmsResult CheckKeyState(int32_t state, std::string& reason) {
   }
 }
 
-KmsResult CheckMasterKey(size_t length, int32_t state, MasterKeyFlags& flags,
-                         std::string& reason) {
+KmsResult CheckMasterKey(size_t length, int32_t state, MasterKeyFlags& flags, std::string& reason) {
   flags = {};
   if (length == 0) {
     reason = "Key not found";
@@ -95,10 +94,10 @@ KmsResult KmipKms::GetKeyState(qlc_session* session, const std::string& keyId, i
 }
 
 KmsResult KmipKms::GetMasterKey(uint32_t server, const std::string& keyId, bool refreshState,
-                                Groundwork::SecureBytes& key, int32_t& state,
-                                std::string& reason) {
+                                Groundwork::SecureBytes& key, int32_t& state, std::string& reason) {
   const char* provider = info_->name.c_str();
   state = kKeyStateUnknown;
+  if (!HasServer(server, reason)) return OtherFailure;
   if (keyId == info_->masterKeyId) {
     UserLock::ReadGuard guard(*lock_);
     if (statusValid_ && !cachedKey_.empty()) {
@@ -154,10 +153,7 @@ KmsResult KmipKms::GetMasterKey(uint32_t server, const std::string& keyId, bool 
 KmsResult KmipKms::GenerateKey(uint32_t server, uint32_t keyLength,
                                Groundwork::SecureString& plainKey, std::string& wrappedKey,
                                std::string& reason) {
-  if (server >= info_->servers.size()) {
-    reason = "No server with index " + std::to_string(server);
-    return OtherFailure;
-  }
+  if (!HasServer(server, reason)) return OtherFailure;
   const std::string& keyId = info_->masterKeyId;
   Groundwork::SecureBytes masterKey;
   int32_t state = kKeyStateUnknown;
@@ -192,8 +188,7 @@ KmsResult KmipKms::GenerateKey(uint32_t server, uint32_t keyLength,
     Log_Level(2, "Generate key failed, %s\n", reason.c_str());
     return EncodeFailure;
   }
-  if (!KmipMetadataParser::Add(keyId, iv, tag, ciphertext.data(), ciphertext.size(),
-                               wrappedKey)) {
+  if (!KmipMetadataParser::Add(keyId, iv, tag, ciphertext.data(), ciphertext.size(), wrappedKey)) {
     reason = "Failed to add metadata";
     Log_Level(2, "Generate key failed, %s\n", reason.c_str());
     return MetadataFailure;
@@ -204,10 +199,7 @@ KmsResult KmipKms::GenerateKey(uint32_t server, uint32_t keyLength,
 
 KmsResult KmipKms::Decrypt(uint32_t server, const std::string& wrappedKey,
                            Groundwork::SecureString& plainKey, std::string& reason) {
-  if (server >= info_->servers.size()) {
-    reason = "No server with index " + std::to_string(server);
-    return OtherFailure;
-  }
+  if (!HasServer(server, reason)) return OtherFailure;
   KmipMetadataParser parser;
   if (!parser.Parse(wrappedKey)) {
     reason = "Failed to read metadata";

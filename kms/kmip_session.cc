@@ -17,8 +17,7 @@ constexpr const char* kCertFooter = "-----END CERTIFICATE-----";
 constexpr const char* kCertFooterLf = "-----END CERTIFICATE-----\n";
 constexpr const char* kCredentialOptions = ", Options={Authentication={User=%s, Password=%s}}";
 
-void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert,
-                            const char* warning) {
+void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert, const char* warning) {
   if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
     Log_Level(3, "%s", warning);
   }
@@ -31,10 +30,14 @@ void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert,
 
 KmsResult MapKmipError(int error) {
   switch (error) {
-    case 0: return Ok;
-    case kKmipErrorCommunication: return KeyServerCommunicationError;
-    case kKmipErrorTimeout: return KeyServerTimeout;
-    default: return KmipFailure;
+    case 0:
+      return Ok;
+    case kKmipErrorCommunication:
+      return KeyServerCommunicationError;
+    case kKmipErrorTimeout:
+      return KeyServerTimeout;
+    default:
+      return KmipFailure;
   }
 }
 
@@ -49,9 +52,7 @@ void KmipKms::GetTrustedServerCertificates(std::vector<std::string>& certificate
   certificates = info_->trustedServerCertificates;
 }
 
-void KmipKms::GetClientCert(std::string& certificate) {
-  certificate = info_->clientCertificate;
-}
+void KmipKms::GetClientCert(std::string& certificate) { certificate = info_->clientCertificate; }
 
 int KmipKms::GetServerName(uint32_t server, std::string& name) {
   if (server >= info_->servers.size()) {
@@ -65,6 +66,12 @@ int KmipKms::GetServerName(uint32_t server, std::string& name) {
 const std::string& KmipKms::ServerName(uint32_t server) const {
   static const std::string kUnknown = "<none>";
   return server < info_->servers.size() ? info_->servers[server].name : kUnknown;
+}
+
+bool KmipKms::HasServer(uint32_t server, std::string& reason) const {
+  if (server < info_->servers.size()) return true;
+  reason = "No server with index " + std::to_string(server);
+  return false;
 }
 
 Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
@@ -98,7 +105,8 @@ Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
   out.append("User_Trust, Authenticate}");
   if (withTrust) {
     if (!trustedCert.empty()) {
-      AppendStandardizedCert(desc, trustedCert, "Could not standardize trusted server certificate.\n");
+      AppendStandardizedCert(desc, trustedCert,
+                             "Could not standardize trusted server certificate.\n");
     } else {
       for (const auto& cert : info_->trustedServerCertificates) {
         AppendStandardizedCert(desc, cert, "Could not standardize server certificate.\n");
@@ -145,6 +153,7 @@ KmsResult KmipKms::Perform(qlc_session* session, const std::string& keyId, const
 }
 
 KmsResult KmipKms::FetchServerCertificate(uint32_t server, std::string& pem, std::string& reason) {
+  if (!HasServer(server, reason)) return OtherFailure;
   Log_Level(6, "Fetching remote server cert\n");
   qlc_session* session = nullptr;
   Groundwork::SecureString desc = BuildSession(server, false, "");

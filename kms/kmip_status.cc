@@ -53,6 +53,7 @@ struct KmipKms::ProbeResult {
 KmsResult KmipKms::DiscoverVersions(uint32_t server, bool alwaysTrustServer,
                                     const std::string& remoteCert, std::string& reason,
                                     std::vector<std::string>& versions) {
+  if (!HasServer(server, reason)) return OtherFailure;
   const char* name = ServerName(server).c_str();
   qlc_session* session = nullptr;
   qlc_result* result = qlc_connect_key_manager(&session, BuildSession(server, true, "").data());
@@ -164,8 +165,7 @@ void KmipKms::Probe(ProbeResult& result) {
         // Each attempt starts from nothing: bytes left by a failed attempt on
         // an earlier server must never pass for the cached key.
         Groundwork::Wipe(result.key);
-        KmsResult r =
-            GetMasterKey(i, info_->masterKeyId, true, result.key, result.state, reason);
+        KmsResult r = GetMasterKey(i, info_->masterKeyId, true, result.key, result.state, reason);
         MasterKeyFlags flags;
         if (r == Ok) {
           std::string checkReason;
@@ -174,7 +174,8 @@ void KmipKms::Probe(ProbeResult& result) {
           result.status.masterKeyFound = flags.found;
           result.status.masterKeyUsable = flags.usable;
           result.status.keySizeSupported = flags.sizeSupported;
-          Log_Level(6, "Provider %s status update master key found %s usable %s size supported %s\n",
+          Log_Level(6,
+                    "Provider %s status update master key found %s usable %s size supported %s\n",
                     provider, flags.found ? "true" : "false", flags.usable ? "true" : "false",
                     flags.sizeSupported ? "true" : "false");
         }

@@ -91,18 +91,20 @@ TEST_F(TrustMaterialTest, FailedCommitsGive2AndChangeNothing) {
   EXPECT_EQ(ExportAll(), before);
 }
 
-TEST_F(TrustMaterialTest, ReadsThatCatchNothingPassAStoreExceptionOn) {
+TEST_F(TrustMaterialTest, MistypedStoredValuesGive2) {
   Tamper("p1", [](ProviderConfigObjects& o) {
     o.keyServer->SetValue("server_cert", std::string("one string, not a list"));
     o.kmipServer->CreateSubObject(SubObjectId("client_certificate"))->SetValue("certificate", 5L);
+    o.kmipServer->CreateSubObject(SubObjectId("client_CSR"))->SetValue("private_key", 6L);
     o.kmipServer->SetValue("credential", 7L);
   });
   std::vector<std::string> certs;
   std::string a, b;
-  EXPECT_THROW(GetServerCertificates("p1", certs), ConfigStoreException);
-  EXPECT_THROW(GetClientCertificate("p1", a, b), ConfigStoreException);
-  EXPECT_EQ(GetCredential("p1", a), kStoreError);  // this one catches
-  EXPECT_EQ(log_.Count("Exception reading credential from config store: "), 1u);
+  EXPECT_EQ(GetServerCertificates("p1", certs), kStoreError);
+  EXPECT_EQ(GetClientCertificate("p1", a, b), kStoreError);
+  EXPECT_EQ(GetClientCsr("p1", a, b), kStoreError);
+  EXPECT_EQ(GetCredential("p1", a), kStoreError);
+  EXPECT_EQ(log_.Count("Exception reading "), 4u);
 }
 
 }  // namespace

@@ -116,8 +116,18 @@ TEST(KmsChecks, VersionSupportAndServerIndex) {
   KmipKms client(Info());
   std::string name, wrapped, reason;
   EXPECT_NE(client.GetServerName(2, name), 0);
+  // Every operation that takes a server index refuses one beyond the servers.
   Groundwork::SecureString key;
+  Groundwork::SecureBytes master;
+  int32_t state = 0;
+  std::string pem;
+  std::vector<std::string> versions;
   EXPECT_EQ(client.GenerateKey(2, 16, key, wrapped, reason), OtherFailure);
+  EXPECT_EQ(client.Decrypt(2, wrapped, key, reason), OtherFailure);
+  EXPECT_EQ(client.GetMasterKey(2, "mk-1", true, master, state, reason), OtherFailure);
+  EXPECT_EQ(client.GetRemoteServerCertificate(2, pem, reason), OtherFailure);
+  EXPECT_EQ(client.DiscoverVersions(7, true, "", reason, versions), OtherFailure);
+  EXPECT_EQ(reason, "No server with index 7");
 }
 
 }  // namespace
