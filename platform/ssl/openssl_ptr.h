@@ -28,6 +28,7 @@ struct Deleter {
   }
 };
 
+using Asn1TimePtr = std::unique_ptr<ASN1_TIME, Deleter<ASN1_TIME_free>>;
 using BioPtr = std::unique_ptr<BIO, Deleter<BIO_free_all>>;
 using BignumPtr = std::unique_ptr<BIGNUM, Deleter<BN_free>>;
 using EvpCipherCtxPtr = std::unique_ptr<EVP_CIPHER_CTX, Deleter<EVP_CIPHER_CTX_free>>;
