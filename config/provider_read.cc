@@ -11,8 +11,6 @@ using OrnaConfigStore::ConfigStoreException;
 
 namespace {
 
-constexpr std::string_view kCertificateFooterLine = "-----END CERTIFICATE-----\n";
-
 // Reads values of one record, remembering the name being read so that an
 // exception can be reported with it.
 class ValueReader {
@@ -52,8 +50,7 @@ int LoadProviderObjects(const std::string& name, ProviderConfigObjects& objects)
 // (with a warning) when it cannot be standardised.
 std::string StandardizedCertificate(const std::string& stored) {
   std::string pem = stored;
-  if (!Kestrel::Common::SslUtils::StandardizePemString(
-          Kestrel::Common::SslUtils::kCertificateHeader, kCertificateFooterLine, pem)) {
+  if (!Kestrel::Common::SslUtils::StandardizePemCert(pem)) {
     Log_Level(3, "Failed to standardize certificate.\n");
   }
   return pem;

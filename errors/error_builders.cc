@@ -55,6 +55,22 @@ Lumo::Data::ErrorValuePtr MakeConfigStoreError(int status) {
   return MakeConfigStoreError(status, {});
 }
 
+Lumo::Data::ErrorValuePtr MakeInvalidParameterError(const std::string& parameter) {
+  return MakeInvalidArgumentError(
+      {Message("com.tarsel.orna.kms.providers.invalid_argument", {{"parameter", parameter}})});
+}
+
+Lumo::Data::ErrorValuePtr MakeProviderNotFoundError(const std::string& provider) {
+  return MakeNotFoundError(
+      {Message("com.tarsel.orna.kms.providers.not_found", {{"provider", provider}})});
+}
+
+Lumo::Data::ErrorValuePtr MakeProviderStoreError(int status, const std::string& provider) {
+  const char* id = status == 1 ? "com.tarsel.orna.kms.providers.already_exists"
+                               : "com.tarsel.orna.kms.providers.not_found";
+  return MakeConfigStoreError(status, {Message(id, {{"provider", provider}})});
+}
+
 const Lumo::L10n::Localizer& CatalogueLocalizer() {
   static const Lumo::L10n::Localizer localizer({"en_US"}, ResolveMessage);
   return localizer;

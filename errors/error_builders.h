@@ -3,6 +3,7 @@
 // carrying the messages passed in (copied) and that class's error type.
 #pragma once
 
+#include <string>
 #include <vector>
 
 #include "platform/lumo/errors.h"
@@ -11,17 +12,27 @@ namespace Zyrd::ZyrApi {
 
 using Messages = std::vector<Lumo::L10n::LocalizableMessage>;
 
-Lumo::Data::ErrorValuePtr MakeError(const Messages& messages);             // Error, type 0
-Lumo::Data::ErrorValuePtr MakeNotFoundError(const Messages& messages);     // NotFound, 12
+Lumo::Data::ErrorValuePtr MakeError(const Messages& messages);                 // Error, type 0
+Lumo::Data::ErrorValuePtr MakeNotFoundError(const Messages& messages);         // NotFound, 12
 Lumo::Data::ErrorValuePtr MakeInvalidArgumentError(const Messages& messages);  // InvalidArgument, 7
-Lumo::Data::ErrorValuePtr MakeUnsupportedError(const Messages& messages);  // Unsupported, 23
-Lumo::Data::ErrorValuePtr MakeUnauthenticatedError(const Messages& messages);  // Unauthenticated, 20
+Lumo::Data::ErrorValuePtr MakeUnsupportedError(const Messages& messages);      // Unsupported, 23
+Lumo::Data::ErrorValuePtr MakeUnauthenticatedError(
+    const Messages& messages);  // Unauthenticated, 20
 
 // Store status -> error: 1 AlreadyExists and 3 NotFound with `messages`; any
 // other status an Error whose only message is
 // "com.tarsel.orna.kms.providers.config_store_error" (`messages` unused).
 Lumo::Data::ErrorValuePtr MakeConfigStoreError(int status, const Messages& messages);
 Lumo::Data::ErrorValuePtr MakeConfigStoreError(int status);
+
+// invalid_argument with "com.tarsel.orna.kms.providers.invalid_argument"
+// naming `parameter`.
+Lumo::Data::ErrorValuePtr MakeInvalidParameterError(const std::string& parameter);
+// not_found with "com.tarsel.orna.kms.providers.not_found" naming `provider`.
+Lumo::Data::ErrorValuePtr MakeProviderNotFoundError(const std::string& provider);
+// MakeConfigStoreError for a provider's store status: 1 names the provider
+// as already existing, 3 as not found; others are config_store_error.
+Lumo::Data::ErrorValuePtr MakeProviderStoreError(int status, const std::string& provider);
 
 // The localizer that services convert their messages with: en_US over the
 // message catalogue. Built once, shared, thread-safe.

@@ -12,13 +12,10 @@
 namespace Zyrd::Kms {
 namespace {
 
-constexpr const char* kCertHeader = "-----BEGIN CERTIFICATE-----";
-constexpr const char* kCertFooter = "-----END CERTIFICATE-----";
-constexpr const char* kCertFooterLf = "-----END CERTIFICATE-----\n";
 constexpr const char* kCredentialOptions = ", Options={Authentication={User=%s, Password=%s}}";
 
 void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert, const char* warning) {
-  if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
+  if (!Kestrel::Common::SslUtils::StandardizePemCert(cert)) {
     Log_Level(3, "%s", warning);
   }
   out.str().append(", Trusted_Cert=PEM:[");
@@ -93,7 +90,7 @@ Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
   out.append("Timeout=").append(std::to_string(timeout)).append(":Seconds, ");
   if (!info_->clientCertificate.empty()) {
     std::string cert = info_->clientCertificate;
-    if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooterLf, cert)) {
+    if (!Kestrel::Common::SslUtils::StandardizePemCert(cert)) {
       Log_Level(3, "Could not standardize client certificate.\n");
     }
     std::string certHex = Groundwork::HexEncode(cert);
@@ -193,7 +190,9 @@ KmsResult KmipKms::FetchServerCertificate(uint32_t server, std::string& pem, std
               ServerName(server).c_str(), reason.c_str());
     return r;
   }
-  if (!Kestrel::Common::SslUtils::StandardizePemString(kCertHeader, kCertFooter, pem)) {
+  if (!Kestrel::Common::SslUtils::StandardizePemString(
+          Kestrel::Common::SslUtils::kCertificateHeader,
+          Kestrel::Common::SslUtils::kCertificateFooter, pem)) {
     Log_Level(3, "Failed to standardize server certificate of key server %s\n",
               ServerName(server).c_str());
   }

@@ -9,16 +9,6 @@ namespace {
 
 using Zyrd::ZyrApi::Message;
 
-::Lumo::Data::ErrorValuePtr InvalidArgument(const char* parameter) {
-  return Zyrd::ZyrApi::MakeInvalidArgumentError(
-      {Message("com.tarsel.orna.kms.providers.invalid_argument", {{"parameter", parameter}})});
-}
-
-::Lumo::Data::ErrorValuePtr ProviderNotFound(const std::string& provider) {
-  return Zyrd::ZyrApi::MakeNotFoundError(
-      {Message("com.tarsel.orna.kms.providers.not_found", {{"provider", provider}})});
-}
-
 // The walk over a provider's servers shared by generate_key and decrypt.
 // `attempt(index, reason)` tries one server. Returns the error to answer
 // with, or null when a server succeeded.
@@ -61,19 +51,19 @@ void KeyOperationImpl::generate_key(const std::string& provider, int64_t keySize
   };
   if (provider.empty()) {
     Log_Level(2, "Generate key called on an empty provider\n");
-    return fail(InvalidArgument("provider"));
+    return fail(Zyrd::ZyrApi::MakeInvalidParameterError("provider"));
   }
   // The key size is the number of bytes to generate: a zero-length key is no
   // key, and a huge one would only exhaust memory.
   if (keySize < 1 || keySize > kMaxKeySize) {
     Log_Level(2, "Generate key called with an invalid key size %lld on provider %s\n",
               static_cast<long long>(keySize), provider.c_str());
-    return fail(InvalidArgument("keySize"));
+    return fail(Zyrd::ZyrApi::MakeInvalidParameterError("keySize"));
   }
   std::shared_ptr<Zyrd::Kms::Kms> client = providers_->GetProvider(provider);
   if (client == nullptr) {
     Log_Level(2, "Provider %s does not exist\n", provider.c_str());
-    return fail(ProviderNotFound(provider));
+    return fail(Zyrd::ZyrApi::MakeProviderNotFoundError(provider));
   }
   GeneratedKey key;
   key.key.emplace();
@@ -104,12 +94,12 @@ void KeyOperationImpl::decrypt(const std::string& provider, const std::string& w
   };
   if (provider.empty()) {
     Log_Level(2, "Decrypt called on an empty provider\n");
-    return fail(InvalidArgument("provider"));
+    return fail(Zyrd::ZyrApi::MakeInvalidParameterError("provider"));
   }
   std::shared_ptr<Zyrd::Kms::Kms> client = providers_->GetProvider(provider);
   if (client == nullptr) {
     Log_Level(2, "Provider %s does not exist\n", provider.c_str());
-    return fail(ProviderNotFound(provider));
+    return fail(Zyrd::ZyrApi::MakeProviderNotFoundError(provider));
   }
   DecryptResult plain;
   ::Lumo::Data::ErrorValuePtr error = TryServers(

@@ -20,20 +20,6 @@ constexpr const char* kServerPortParam = "spec.keyServer.kmipServer.servers.serv
 constexpr const char* kProxyHostParam = "spec.keyServer.proxyServer.hostname";
 constexpr const char* kProxyPortParam = "spec.keyServer.proxyServer.port";
 
-ErrorPtr InvalidArgument(const char* parameter) {
-  return Zyrd::ZyrApi::MakeInvalidArgumentError(
-      {Message("com.tarsel.orna.kms.providers.invalid_argument", {{"parameter", parameter}})});
-}
-
-// A store status as an API error: 1 already_exists and 3 not_found name the
-// provider; anything else is config_store_error.
-ErrorPtr StoreError(int status, const std::string& provider) {
-  const char* id = status == Config::kStoreAlreadyExists
-                       ? "com.tarsel.orna.kms.providers.already_exists"
-                       : "com.tarsel.orna.kms.providers.not_found";
-  return Zyrd::ZyrApi::MakeConfigStoreError(status, {Message(id, {{"provider", provider}})});
-}
-
 ErrorPtr FirewallError() {
   return Zyrd::ZyrApi::MakeError({Message("com.tarsel.orna.kms.providers.firewall_error")});
 }
@@ -189,13 +175,13 @@ void ProvidersImpl::list(::Lumo::AsyncResult<std::vector<Summary>> result) {
 void ProvidersImpl::get(const std::string& provider, ::Lumo::AsyncResult<Info> result) {
   if (provider.empty()) {
     Log_Level(2, "Get provider called on an empty provider\n");
-    return result.SetError(InvalidArgument("provider"));
+    return result.SetError(Zyrd::ZyrApi::MakeInvalidParameterError("provider"));
   }
   std::shared_ptr<Info> info;
   int rc = Config::ReadProviderInfo(provider, info);
   if (rc != Config::kStoreOk) {
     Log_Level(2, "Get provider %s failed, %d\n", provider.c_str(), rc);
-    return result.SetError(StoreError(rc, provider));
+    return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, provider));
   }
   result.SetResult(*info);
 }
@@ -204,7 +190,7 @@ void ProvidersImpl::create(const CreateSpec& spec, ::Lumo::AsyncResult<void> res
   const std::string& name = spec.provider;
   if (const char* bad = CheckCreate(spec)) {
     Log_Level(2, "Create provider %s failed, invalid argument %s\n", name.c_str(), bad);
-    return result.SetError(InvalidArgument(bad));
+    return result.SetError(Zyrd::ZyrApi::MakeInvalidParameterError(bad));
   }
   UserLock::WriteGuard lock(Config::ConfigLock());
   Config::ProviderConfigObjects objects;
@@ -214,7 +200,7 @@ void ProvidersImpl::create(const CreateSpec& spec, ::Lumo::AsyncResult<void> res
   if (rc == Config::kStoreOk) rc = SetNewProvider(objects, spec, hosts);
   if (rc != Config::kStoreOk) {
     Log_Level(2, "Create provider %s failed, %d\n", name.c_str(), rc);
-    return result.SetError(StoreError(rc, name));
+    return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, name));
   }
   if (!firewall_.Update(name, true, hosts, {})) {
     Log_Level(2, "Create provider %s failed to add ips to firewall\n", name.c_str());
@@ -228,7 +214,7 @@ void ProvidersImpl::create(const CreateSpec& spec, ::Lumo::AsyncResult<void> res
     if (!firewall_.Update(name, true, {}, hosts)) {
       Log_Level(2, "Create provider %s failed to remove ip from firewall\n", name.c_str());
     }
-    return result.SetError(StoreError(rc, name));
+    return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, name));
   }
   result.SetResult();
 }
@@ -237,12 +223,12 @@ void ProvidersImpl::update(const std::string& provider, const UpdateSpec& spec,
                            ::Lumo::AsyncResult<void> result) {
   if (const char* bad = CheckUpdate(provider, spec)) {
     Log_Level(2, "Update provider %s failed, invalid argument %s\n", provider.c_str(), bad);
-    return result.SetError(InvalidArgument(bad));
+    return result.SetError(Zyrd::ZyrApi::MakeInvalidParameterError(bad));
   }
   UserLock::WriteGuard lock(Config::ConfigLock());
   auto fail = [&](int rc) {
     Log_Level(2, "Update provider %s failed, %d\n", provider.c_str(), rc);
-    result.SetError(StoreError(rc, provider));
+    result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, provider));
   };
   Config::ProviderConfigObjects objects;
   int rc = Config::GetProviderObjects(provider, objects);
@@ -259,7 +245,7 @@ void ProvidersImpl::update(const std::string& provider, const UpdateSpec& spec,
                                   ks.proxyServer.has_value(), oldHosts, oldProxy);
     if (rc != Config::kStoreOk) {
       Log_Level(2, "Update provider %s failed to get ips to update firewall\n", provider.c_str());
-      return result.SetError(StoreError(rc, provider));
+      return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, provider));
     }
     if (!oldProxy.empty()) oldHosts.push_back(oldProxy);
     rc = SetKeyServerChanges(objects, ks, newHosts);
@@ -285,7 +271,7 @@ void ProvidersImpl::update(const std::string& provider, const UpdateSpec& spec,
 void ProvidersImpl::delete_(const std::string& provider, ::Lumo::AsyncResult<void> result) {
   if (provider.empty()) {
     Log_Level(2, "Delete provider called on an empty provider\n");
-    return result.SetError(InvalidArgument("provider"));
+    return result.SetError(Zyrd::ZyrApi::MakeInvalidParameterError("provider"));
   }
   UserLock::WriteGuard lock(Config::ConfigLock());
   std::vector<std::string> hosts;
@@ -293,13 +279,13 @@ void ProvidersImpl::delete_(const std::string& provider, ::Lumo::AsyncResult<voi
   int rc = Config::GetProviderHosts(provider, true, true, hosts, proxy);
   if (rc != Config::kStoreOk) {
     Log_Level(2, "Delete provider %s failed to get ips to update firewall\n", provider.c_str());
-    return result.SetError(StoreError(rc, provider));
+    return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, provider));
   }
   if (!proxy.empty()) hosts.push_back(proxy);
   rc = Config::DeleteProvider(provider);
   if (rc != Config::kStoreOk) {
     Log_Level(2, "Delete provider %s failed: %d\n", provider.c_str(), rc);
-    return result.SetError(StoreError(rc, provider));
+    return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, provider));
   }
   providers_->DeleteProviderFromState(provider);
   if (!firewall_.Update(provider, true, {}, hosts)) {

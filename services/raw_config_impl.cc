@@ -1,7 +1,5 @@
 #include "services/raw_config_impl.h"
 
-#include <openssl/crypto.h>
-
 #include "config/config_lock.h"
 #include "config/config_transfer.h"
 #include "errors/error_builders.h"
@@ -14,21 +12,12 @@ namespace {
 using Zyrd::ZyrApi::Message;
 
 ::Lumo::Data::ErrorValuePtr InvalidConfiguration() {
-  return Zyrd::ZyrApi::MakeInvalidArgumentError({Message(
-      "com.tarsel.orna.kms.providers.invalid_argument", {{"parameter", "configuration"}})});
+  return Zyrd::ZyrApi::MakeInvalidParameterError("configuration");
 }
 
 ::Lumo::Data::ErrorValuePtr StoreError() {
   return Zyrd::ZyrApi::MakeError({Message("com.tarsel.orna.kms.raw_config.config_store_error")});
 }
-
-// A std::string copy of a secret text for the calls that take one; wiped
-// when it goes away (it is never resized, so no other copy is left).
-struct WipedCopy {
-  explicit WipedCopy(std::string_view text) : text(text) {}
-  ~WipedCopy() { OPENSSL_cleanse(text.data(), text.size()); }
-  std::string text;
-};
 
 }  // namespace
 
@@ -41,15 +30,16 @@ void RawConfigImpl::get(const std::optional<InfoType>& infoType, ::Lumo::AsyncRe
     return result.SetError(Zyrd::ZyrApi::MakeInvalidArgumentError(
         {Message("com.tarsel.orna.kms.raw_config.unknown_infotype")}));
   }
-  WipedCopy config("");
+  std::string config;
+  Groundwork::WipeOnExit wipe(config);
   Info info;
-  if (Zyrd::Config::ExportConfig(config.text, info.hash) != 0) {
+  if (Zyrd::Config::ExportConfig(config, info.hash) != 0) {
     Log_Level(2, "Failed to read from config store\n");
     return result.SetError(StoreError());
   }
   if (infoType && infoType->value == InfoType::CONFIG_AND_HASH) {
     info.configuration.emplace();
-    if (!Kestrel::Common::Gzip::CompressFromString(config.text, *info.configuration)) {
+    if (!Kestrel::Common::Gzip::CompressFromString(config, *info.configuration)) {
       Log_Level(2, "Failed to compress the configuration\n");
       return result.SetError(
           Zyrd::ZyrApi::MakeError({Message("com.tarsel.orna.kms.raw_config.compress_error")}));
@@ -74,14 +64,15 @@ void RawConfigImpl::set(const Groundwork::SecureBytes& configuration,
     Log_Level(2, "Raw configuration refused: %s\n", reason.c_str());
     return result.SetError(InvalidConfiguration());
   }
-  WipedCopy config(text.view());
+  std::string config(text.view());
+  Groundwork::WipeOnExit wipe(config);
   text.Wipe();
-  if (!Zyrd::Config::CheckImportScope(config.text, reason)) {
+  if (!Zyrd::Config::CheckImportScope(config, reason)) {
     Log_Level(2, "Raw configuration refused: %s\n", reason.c_str());
     return result.SetError(InvalidConfiguration());
   }
   UserLock::WriteGuard lock(Zyrd::Config::ConfigLock());
-  if (Zyrd::Config::ImportConfig(config.text) != 0) {
+  if (Zyrd::Config::ImportConfig(config) != 0) {
     Log_Level(2, "Failed to write to config store\n");
     return result.SetError(StoreError());
   }

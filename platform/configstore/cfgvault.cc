@@ -26,6 +26,7 @@
 
 #include "platform/configstore/export_codec.h"
 #include "platform/configstore/sqlite_store.h"
+#include "platform/util/secure_buffer.h"
 
 namespace {
 
@@ -39,12 +40,6 @@ constexpr const char* kUsage =
 struct Failure {
   int status;
   std::string reason;
-};
-
-// Overwrites a text that may hold secrets once it has been used.
-struct WipeOnExit {
-  std::string& text;
-  ~WipeOnExit() { OPENSSL_cleanse(text.data(), text.size()); }
 };
 
 ConfigStoreObjectId IdFrom(const std::vector<std::string>& args, bool withInstance) {
@@ -80,7 +75,7 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
   if (command == "import") {
     if (args.size() != 2) throw Failure{2, kUsage};
     std::string text = ReadInput(args[1]);
-    WipeOnExit wipe{text};
+    Groundwork::WipeOnExit wipe(text);
     std::vector<ErrorInfo> errors;
     if (!SqliteConfigStore::Open(dbPath)->Import(text, errors)) {
       throw Failure{1, "import refused: " + (errors.empty() ? "" : errors.front().message)};
@@ -94,7 +89,7 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
 
   if (command == "export") {
     std::string text = store->Export({FilterSpecObject(id)}) + "\n";
-    WipeOnExit wipe{text};
+    Groundwork::WipeOnExit wipe(text);
     Print(text);
   } else if (command == "list") {
     std::string text;
@@ -106,7 +101,7 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
     auto object = store->GetObject(id);
     if (!object) throw Failure{1, "no object " + id.ToString()};
     std::string text = Codec::EncodeObject(*object) + "\n";
-    WipeOnExit wipe{text};
+    Groundwork::WipeOnExit wipe(text);
     Print(text);
   } else if (!store->DeleteObject(id)) {
     throw Failure{1, "no object " + id.ToString()};

@@ -73,6 +73,11 @@ bool StandardizePemString(std::string_view header, std::string_view footer, std:
   return true;
 }
 
+bool StandardizePemCert(std::string& pem) {
+  static const std::string kFooterLine = std::string(kCertificateFooter) + "\n";
+  return StandardizePemString(kCertificateHeader, kFooterLine, pem);
+}
+
 bool ExtractKeyFromCert(const std::string& certPem, std::string& keyPem) {
   BioPtr in = Ssl::ReadOnlyBio(certPem);
   if (!in) return false;

@@ -40,6 +40,9 @@ inline constexpr std::string_view kCsrFooter = "-----END CERTIFICATE REQUEST----
 // not.
 bool StandardizePemString(std::string_view header, std::string_view footer, std::string& pem);
 
+// StandardizePemString for one certificate, ending in a line feed.
+bool StandardizePemCert(std::string& pem);
+
 // The public key of the PEM certificate `certPem` as a PEM "PUBLIC KEY"
 // block (SubjectPublicKeyInfo), the form JWT libraries take to verify
 // RS256 (and ES256) signatures. Fails when `certPem` holds no certificate.

@@ -94,4 +94,18 @@ class SecureString {
   Base s_;
 };
 
+// Overwrites a plain string that holds a secret (for interfaces that take
+// one) when the guard goes away. The string must not have been reallocated
+// since the secret went in, or an old buffer keeps a copy.
+class WipeOnExit {
+ public:
+  explicit WipeOnExit(std::string& text) : text_(text) {}
+  WipeOnExit(const WipeOnExit&) = delete;
+  WipeOnExit& operator=(const WipeOnExit&) = delete;
+  ~WipeOnExit() { OPENSSL_cleanse(text_.data(), text_.capacity()); }
+
+ private:
+  std::string& text_;
+};
+
 }  // namespace Groundwork
