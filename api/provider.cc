@@ -15,9 +15,15 @@
 #include "platform/util/log.h"
 #include "platform/util/panic.h"
 #include "platform/util/paths.h"
+#include "services/client_certificate_impl.h"
+#include "services/credential_impl.h"
+#include "services/csr_impl.h"
 #include "services/key_operation_impl.h"
+#include "services/provider_status_impl.h"
 #include "services/providers_impl.h"
 #include "services/raw_config_impl.h"
+#include "services/remote_impl.h"
+#include "services/server_certificates_impl.h"
 #include "services/status_impl.h"
 
 namespace Zyrd::ZyrApi {
@@ -103,16 +109,28 @@ Lumo::Provider::ApiProviderPtr CreateLocalProvider(Lumo::Executor executor,
   VERIFY(deps.providers != nullptr && deps.firewall != nullptr && deps.clock != nullptr &&
          deps.stats != nullptr);
 
-  // The daemon's services, in binding order. Services without an
-  // implementation in this build are described by the metadata but not bound;
-  // calls to them answer operation_not_found.
+  // The daemon's services, in binding order.
+  namespace P = Kms::Providers;
+  const auto& providers = deps.providers;
   std::vector<Lumo::Provider::ApiInterfacePtr> interfaces = {
       Kms::KeyOperationSvc::AsyncServiceBinder::BindImplementation(
-          std::make_shared<Kms::KeyOperationSvc::KeyOperationImpl>(deps.providers, *deps.stats)),
+          std::make_shared<Kms::KeyOperationSvc::KeyOperationImpl>(providers, *deps.stats)),
+      P::ServerCertificatesSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<P::ServerCertificatesSvc::ServerCertificatesImpl>(providers)),
+      P::ServerCertificates::RemoteSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<P::ServerCertificates::RemoteSvc::RemoteImpl>(providers)),
+      P::ClientCertificate::CsrSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<P::ClientCertificate::CsrSvc::CsrImpl>(providers)),
       Kms::ProvidersSvc::AsyncServiceBinder::BindImplementation(
-          std::make_shared<Kms::ProvidersSvc::ProvidersImpl>(deps.providers, *deps.firewall)),
+          std::make_shared<Kms::ProvidersSvc::ProvidersImpl>(providers, *deps.firewall)),
+      P::CredentialSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<P::CredentialSvc::CredentialImpl>(providers)),
+      P::ClientCertificateSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<P::ClientCertificateSvc::ClientCertificateImpl>(providers)),
       Kms::RawConfigSvc::AsyncServiceBinder::BindImplementation(
-          std::make_shared<Kms::RawConfigSvc::RawConfigImpl>(deps.providers)),
+          std::make_shared<Kms::RawConfigSvc::RawConfigImpl>(providers)),
+      P::StatusSvc::AsyncServiceBinder::BindImplementation(
+          std::make_shared<P::StatusSvc::StatusImpl>(providers)),
       Kms::StatusSvc::AsyncServiceBinder::BindImplementation(
           std::make_shared<Kms::StatusSvc::StatusImpl>()),
   };

@@ -92,9 +92,6 @@ TEST_F(ApiProviderTest, CallsAndTheirOutcomesThroughTheWholeChain) {
       {"com.tarsel.orna.kms.status.get", "{}", attest,
        R"({"output":{"health":"HEALTHY","details":"","messages":[]}})"},
       {"com.tarsel.orna.kms.providers.list", "{}", attest, e + "unauthorized"},
-      // Described by the metadata, served by a later build.
-      {"com.tarsel.orna.kms.providers.credential.get", R"({"provider":"p1"})", admin,
-       e + "operation_not_found"},
       {"com.tarsel.orna.kms.nothing.here", "{}", admin, e + "unauthorized"},
       {ops + "generate_key", R"({"provider":"p1","keysize":32})", attest,
        "Invalid params: field 'keySize': missing"},

@@ -1,0 +1,58 @@
+// The client certificate service
+// "com.tarsel.orna.kms.providers.client_certificate": the certificate and
+// private key the daemon presents to a provider's key servers.
+//
+//   create(provider)                              -> nothing
+//   get(provider, spec?: GetSpec)                 -> Info
+//   set(provider, spec: SetSpec)                  -> nothing
+#pragma once
+
+#include <boost/json/value.hpp>
+#include <boost/json/value_from.hpp>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "platform/lumo/async_result.h"
+#include "platform/lumo/bindings.h"
+#include "platform/util/secure_buffer.h"
+
+namespace Com::Tarsel::Orna::Kms::Providers::ClientCertificateSvc {
+
+inline constexpr const char* kServiceId = "com.tarsel.orna.kms.providers.client_certificate";
+
+struct SetSpec {
+  std::string certificate;                             // PEM
+  std::optional<Groundwork::SecureString> privateKey;  // PEM
+};
+
+struct GetSpec {
+  std::optional<bool> includePrivateKey;
+};
+
+struct Info {
+  std::string certificate;  // empty when none is set
+  std::optional<Groundwork::SecureString> privateKey;
+};
+
+void tag_invoke(boost::json::value_from_tag, boost::json::value& out, const Info& in);
+SetSpec tag_invoke(boost::json::value_to_tag<SetSpec>, const boost::json::value& in);
+GetSpec tag_invoke(boost::json::value_to_tag<GetSpec>, const boost::json::value& in);
+
+class AsyncServiceInterface {
+ public:
+  virtual ~AsyncServiceInterface() = default;
+  // Each operation completes its result exactly once.
+  virtual void create(const std::string& provider, ::Lumo::AsyncResult<void> result) = 0;
+  virtual void get(const std::string& provider, const std::optional<GetSpec>& spec,
+                   ::Lumo::AsyncResult<Info> result) = 0;
+  virtual void set(const std::string& provider, const SetSpec& spec,
+                   ::Lumo::AsyncResult<void> result) = 0;
+};
+
+struct AsyncServiceBinder {
+  static ::Lumo::Provider::ApiInterfacePtr BindImplementation(
+      std::shared_ptr<AsyncServiceInterface> impl);
+};
+
+}  // namespace Com::Tarsel::Orna::Kms::Providers::ClientCertificateSvc
