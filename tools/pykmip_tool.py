@@ -25,6 +25,7 @@ import datetime
 import ipaddress
 import os
 import pathlib
+import socket
 import sys
 import warnings
 
@@ -45,8 +46,14 @@ from cryptography.x509.oid import ExtendedKeyUsageOID, NameOID
 #   other_client   client certificate from other_ca, CN "client", clientAuth
 #   wronghost      server certificate from ca for "elsewhere.invalid" only
 #   selfsigned     self-signed server certificate (same SANs as server)
+#   host_client    client certificate from ca, CN the host's name (what zyrd
+#                  puts in the certificates and requests it makes), clientAuth
+#   server_30d     like server, but with 30 days (and an hour) left
+#   server_31d     like server, but with 31 days (and an hour) left
+# Certificates are valid for 30 days, the server certificate for a year.
 PKI_NAMES = ("ca", "server", "client", "client2", "noeku", "other_ca", "other_server",
-             "other_client", "wronghost", "selfsigned")
+             "other_client", "wronghost", "selfsigned", "host_client", "server_30d",
+             "server_31d")
 
 
 def _name(cn):
@@ -62,7 +69,7 @@ def _rsa_key():
 
 
 def _cert(subject_cn, key, issuer_cert=None, issuer_key=None, ca=False, eku=None,
-          sans=None):
+          sans=None, valid_for=datetime.timedelta(days=30)):
     now = datetime.datetime.now(datetime.timezone.utc)
     issuer_name = issuer_cert.subject if issuer_cert is not None else _name(subject_cn)
     builder = (x509.CertificateBuilder()
@@ -71,7 +78,7 @@ def _cert(subject_cn, key, issuer_cert=None, issuer_key=None, ca=False, eku=None
                .public_key(key.public_key())
                .serial_number(x509.random_serial_number())
                .not_valid_before(now - datetime.timedelta(days=1))
-               .not_valid_after(now + datetime.timedelta(days=30))
+               .not_valid_after(now + valid_for)
                .add_extension(x509.BasicConstraints(ca=ca, path_length=None), critical=True))
     if ca:
         builder = builder.add_extension(
@@ -120,8 +127,11 @@ def make_pki(directory):
     _write(d, "other_ca", other_ca, other_ca_key)
 
     server_key = _rsa_key()
-    _write(d, "server", _cert("kmip server", server_key, ca, ca_key, eku=server_eku,
-                              sans=_server_sans()), server_key)
+    for name, valid_for in (("server", datetime.timedelta(days=365)),
+                            ("server_30d", datetime.timedelta(days=30, hours=1)),
+                            ("server_31d", datetime.timedelta(days=31, hours=1))):
+        _write(d, name, _cert("kmip server", server_key, ca, ca_key, eku=server_eku,
+                              sans=_server_sans(), valid_for=valid_for), server_key)
     _write(d, "other_server", _cert("kmip server", server_key, other_ca, other_ca_key,
                                     eku=server_eku, sans=_server_sans()), server_key)
     _write(d, "wronghost", _cert("kmip server", server_key, ca, ca_key, eku=server_eku,
@@ -131,15 +141,17 @@ def make_pki(directory):
     for name, cn, issuer, issuer_key, eku in (
             ("client", "client", ca, ca_key, client_eku),
             ("client2", "client2", ca, ca_key, client_eku),
+            ("host_client", socket.gethostname(), ca, ca_key, client_eku),
             ("noeku", "client", ca, ca_key, None),
             ("other_client", "client", other_ca, other_ca_key, client_eku)):
         key = _ec_key()
         _write(d, name, _cert(cn, key, issuer, issuer_key, eku=eku), key)
 
 
-def write_server_config(directory, port, run_directory=None):
+def write_server_config(directory, port, run_directory=None, server_cert="server"):
     """Writes server.conf (and an empty policy directory) for 127.0.0.1:port
-    into run_directory (default: directory); returns its path."""
+    into run_directory (default: directory), presenting the PKI's
+    certificate server_cert; returns its path."""
     d = pathlib.Path(directory).resolve()
     run = pathlib.Path(run_directory).resolve() if run_directory else d
     run.mkdir(parents=True, exist_ok=True)
@@ -156,7 +168,7 @@ def write_server_config(directory, port, run_directory=None):
         "policy_path=%s\n"
         "enable_tls_client_auth=True\n"
         "logging_level=INFO\n"
-        "database_path=%s\n" % (port, d / "server.pem", d / "server.key", d / "ca.pem",
+        "database_path=%s\n" % (port, d / (server_cert + ".pem"), d / "server.key", d / "ca.pem",
                                 run / "policies", run / "pykmip.db"))
     return conf
 

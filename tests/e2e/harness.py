@@ -114,9 +114,11 @@ class KmipServer:
     def pem(self, name):
         return self.cert_path(name).read_text()
 
-    def start(self, timeout=30.0):
-        self.port = free_port()
-        conf = pykmip_tool.write_server_config(self.pki, self.port, self.run)
+    def start(self, timeout=30.0, server_cert="server", port=None):
+        # Presents the PKI's certificate server_cert; on port when given (a
+        # restart), else on a free one.
+        self.port = port or free_port()
+        conf = pykmip_tool.write_server_config(self.pki, self.port, self.run, server_cert)
         with open(self.run / "server.out", "ab") as out:
             self.proc = subprocess.Popen(
                 ["/usr/bin/pykmip-server", "-f", str(conf), "-l", str(self.run / "server.log")],
@@ -142,19 +144,20 @@ class KmipServer:
                 self.proc.kill()
                 self.proc.wait()
 
-    def admin(self, *commands):
-        # Runs commands (pykmip_tool.Admin.run word lists) as client "client"
-        # in one session; returns their outputs.
-        admin = pykmip_tool.Admin(self.pki, self.port)
+    def admin(self, *commands, client="client"):
+        # Runs commands (pykmip_tool.Admin.run word lists) as the PKI's client
+        # `client` in one session; returns their outputs.
+        admin = pykmip_tool.Admin(self.pki, self.port, client)
         try:
             return [admin.run(list(c)) for c in commands]
         finally:
             admin.close()
 
-    def create_key(self, bits):
-        # An active AES key of `bits` bits; returns its id.
-        uid = self.admin(("create", str(bits)))[0]
-        self.admin(("activate", uid))
+    def create_key(self, bits, client="client"):
+        # An active AES key of `bits` bits, owned (and so usable only) by the
+        # PKI's client `client`; returns its id.
+        uid = self.admin(("create", str(bits)), client=client)[0]
+        self.admin(("activate", uid), client=client)
         return uid
 
 
@@ -202,12 +205,12 @@ def mint(key_path, *args):
     return done.stdout.decode().strip()
 
 
-def start_seeded(root, spec, request):
-    # A daemon logging verbose detail over a store seeded with spec (see
-    # seed), killed at the end of the pytest request; with a client and the
-    # admin token.
+def start_seeded(root, spec, request, config="<log><level>verbose</level></log>"):
+    # A daemon with the config.xml body config over a store seeded with spec
+    # (see seed), killed at the end of the pytest request; with a client and
+    # the admin token.
     seed(root, spec)
-    write_config(root, "<log><level>verbose</level></log>")
+    write_config(root, config)
     daemon = Daemon(root)
     request.addfinalizer(daemon.kill)
     return types.SimpleNamespace(root=root, daemon=daemon, client=Client(daemon.http_port()),
