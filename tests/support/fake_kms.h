@@ -49,17 +49,29 @@ class FakeKms : public Zyrd::Kms::Kms {
     reason = servers_.at(server).reason;
     return servers_.at(server).decrypt;
   }
-  void GetTrustedServerCertificates(std::vector<std::string>&) override {}
-  void GetClientCert(std::string&) override {}
-  Zyrd::Kms::KmsResult GetRemoteServerCertificate(uint32_t, std::string&, std::string&) override {
-    return Zyrd::Kms::OtherFailure;
+  void GetTrustedServerCertificates(std::vector<std::string>& certificates) override {
+    certificates = trusted;
+  }
+  void GetClientCert(std::string& certificate) override { certificate = clientCert; }
+  // The certificate in `presented` for the server, or OtherFailure when it
+  // has none there.
+  Zyrd::Kms::KmsResult GetRemoteServerCertificate(uint32_t server, std::string& pem,
+                                                  std::string&) override {
+    if (server >= presented.size() || presented[server].empty()) return Zyrd::Kms::OtherFailure;
+    pem = presented[server];
+    return Zyrd::Kms::Ok;
   }
   void UpdateStatus() override { ++updates; }
-  void GetStatus(Zyrd::Kms::KmsStatus&) override {}
+  void GetStatus(Zyrd::Kms::KmsStatus& out) override { out = status; }
 
   std::vector<uint32_t> asked;
   std::vector<uint32_t> keyLengths;
   int updates = 0;
+  // Scripted trust material and status.
+  std::vector<std::string> trusted;
+  std::vector<std::string> presented;
+  std::string clientCert;
+  Zyrd::Kms::KmsStatus status;
 
  private:
   std::vector<Server> servers_;
