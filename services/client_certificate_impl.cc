@@ -108,7 +108,7 @@ void ClientCertificateImpl::get(const std::string& provider, const std::optional
     return result.SetError(MakeError(
         {Message("com.tarsel.orna.kms.invalid_config_value", {{"parameter", "certificate"}})}));
   }
-  if (spec && spec->includePrivateKey.value_or(false)) info.privateKey.emplace(key);
+  if (spec && spec->Wanted()) info.privateKey.emplace(key);
   result.SetResult(info);
 }
 

@@ -88,7 +88,7 @@ void CsrImpl::get(const std::string& provider, const std::optional<GetSpec>& spe
     return result.SetError(MakeError(
         {Message("com.tarsel.orna.kms.invalid_config_value", {{"parameter", "clientCSR"}})}));
   }
-  if (spec && spec->includePrivateKey.value_or(false)) info.privateKey.emplace(key);
+  if (spec && spec->Wanted()) info.privateKey.emplace(key);
   result.SetResult(info);
 }
 

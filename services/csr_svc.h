@@ -15,6 +15,7 @@
 #include "platform/lumo/async_result.h"
 #include "platform/lumo/bindings.h"
 #include "platform/util/secure_buffer.h"
+#include "services/service_inputs.h"
 
 namespace Com::Tarsel::Orna::Kms::Providers::ClientCertificate::CsrSvc {
 
@@ -25,9 +26,7 @@ struct SetSpec {
   Groundwork::SecureString privateKey;  // PEM
 };
 
-struct GetSpec {
-  std::optional<bool> includePrivateKey;
-};
+using GetSpec = IncludePrivateKeySpec;
 
 struct Info {
   std::string clientCSR;  // empty when none is pending
@@ -36,7 +35,6 @@ struct Info {
 
 void tag_invoke(boost::json::value_from_tag, boost::json::value& out, const Info& in);
 SetSpec tag_invoke(boost::json::value_to_tag<SetSpec>, const boost::json::value& in);
-GetSpec tag_invoke(boost::json::value_to_tag<GetSpec>, const boost::json::value& in);
 
 class AsyncServiceInterface {
  public:

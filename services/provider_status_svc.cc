@@ -1,25 +1,11 @@
 #include "services/provider_status_svc.h"
 
 #include "platform/lumo/json_storage.h"
+#include "services/service_inputs.h"
 
 namespace Com::Tarsel::Orna::Kms::Providers::StatusSvc {
 
 namespace json = boost::json;
-
-namespace {
-
-struct GetInput {
-  std::string provider;
-};
-
-GetInput tag_invoke(json::value_to_tag<GetInput>, const json::value& in) {
-  ::Lumo::Bindings::ObjectReader r(in);
-  GetInput out{r.String("provider")};
-  r.Finish();
-  return out;
-}
-
-}  // namespace
 
 void tag_invoke(json::value_from_tag, json::value& out, const ServerInfo& in) {
   out = {{"health", HealthName(in.health)},
@@ -41,8 +27,8 @@ void tag_invoke(json::value_from_tag, json::value& out, const Info& in) {
     std::shared_ptr<AsyncServiceInterface> impl) {
   return std::make_shared<const ::Lumo::Provider::ApiInterface>(::Lumo::Provider::ApiInterface{
       kServiceId,
-      {::Lumo::Provider::BindOperation<GetInput, Info>(
-          "get", [impl](GetInput in, ::Lumo::AsyncResult<Info> result,
+      {::Lumo::Provider::BindOperation<ProviderInput, Info>(
+          "get", [impl](ProviderInput in, ::Lumo::AsyncResult<Info> result,
                         const ::Lumo::Core::AsyncActivation& activation) {
             impl->get(in.provider, activation, std::move(result));
           })}});

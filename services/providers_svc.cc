@@ -1,5 +1,7 @@
 #include "services/providers_svc.h"
 
+#include "services/service_inputs.h"
+
 namespace Com::Tarsel::Orna::Kms::ProvidersSvc {
 
 namespace json = boost::json;
@@ -129,31 +131,10 @@ namespace {
 struct CreateInput {
   CreateSpec spec;
 };
-struct UpdateInput {
-  std::string provider;
-  UpdateSpec spec;
-};
-struct ProviderInput {
-  std::string provider;
-};
 
 CreateInput tag_invoke(json::value_to_tag<CreateInput>, const json::value& in) {
   ObjectReader r(in);
   CreateInput out{r.Struct<CreateSpec>("spec")};
-  r.Finish();
-  return out;
-}
-
-UpdateInput tag_invoke(json::value_to_tag<UpdateInput>, const json::value& in) {
-  ObjectReader r(in);
-  UpdateInput out{r.String("provider"), r.Struct<UpdateSpec>("spec")};
-  r.Finish();
-  return out;
-}
-
-ProviderInput tag_invoke(json::value_to_tag<ProviderInput>, const json::value& in) {
-  ObjectReader r(in);
-  ProviderInput out{r.String("provider")};
   r.Finish();
   return out;
 }
@@ -166,6 +147,7 @@ ProviderInput tag_invoke(json::value_to_tag<ProviderInput>, const json::value& i
   using ::Lumo::Bindings::NoInput;
   using ::Lumo::Provider::BindOperation;
   using Activation = ::Lumo::Core::AsyncActivation;
+  using UpdateInput = ProviderSpecInput<UpdateSpec>;
   return std::make_shared<const ::Lumo::Provider::ApiInterface>(::Lumo::Provider::ApiInterface{
       kServiceId,
       {BindOperation<NoInput, std::vector<Summary>>(

@@ -1,27 +1,12 @@
 #include "services/remote_svc.h"
 
 #include "platform/lumo/json_storage.h"
+#include "services/service_inputs.h"
 
 namespace Com::Tarsel::Orna::Kms::Providers::ServerCertificates::RemoteSvc {
 
 namespace json = boost::json;
 using ::Lumo::Bindings::ObjectReader;
-
-namespace {
-
-struct ListInput {
-  std::string provider;
-  std::optional<FilterSpec> spec;
-};
-
-ListInput tag_invoke(json::value_to_tag<ListInput>, const json::value& in) {
-  ObjectReader r(in);
-  ListInput out{r.String("provider"), r.OptionalStruct<FilterSpec>("spec")};
-  r.Finish();
-  return out;
-}
-
-}  // namespace
 
 void tag_invoke(json::value_from_tag, json::value& out, const Summary& in) {
   json::object& o = out.emplace_object();
@@ -49,6 +34,7 @@ FilterSpec tag_invoke(json::value_to_tag<FilterSpec>, const json::value& in) {
 ::Lumo::Provider::ApiInterfacePtr AsyncServiceBinder::BindImplementation(
     std::shared_ptr<AsyncServiceInterface> impl) {
   using Result = ::Lumo::AsyncResult<std::vector<Summary>>;
+  using ListInput = ProviderOptionalSpecInput<FilterSpec>;
   return std::make_shared<const ::Lumo::Provider::ApiInterface>(::Lumo::Provider::ApiInterface{
       kServiceId,
       {::Lumo::Provider::BindOperation<ListInput, std::vector<Summary>>(

@@ -1,5 +1,7 @@
 #include "services/server_certificates_svc.h"
 
+#include "services/service_inputs.h"
+
 namespace Com::Tarsel::Orna::Kms::Providers::ServerCertificatesSvc {
 
 namespace json = boost::json;
@@ -11,20 +13,10 @@ struct SetInput {
   std::string provider;
   std::vector<std::string> certificates;
 };
-struct GetInput {
-  std::string provider;
-};
 
 SetInput tag_invoke(json::value_to_tag<SetInput>, const json::value& in) {
   ObjectReader r(in);
   SetInput out{r.String("provider"), r.StringList("certificates")};
-  r.Finish();
-  return out;
-}
-
-GetInput tag_invoke(json::value_to_tag<GetInput>, const json::value& in) {
-  ObjectReader r(in);
-  GetInput out{r.String("provider")};
   r.Finish();
   return out;
 }
@@ -47,8 +39,8 @@ void tag_invoke(json::value_from_tag, json::value& out, const Info& in) {
            [impl](SetInput in, AsyncResult<void> result, const Activation&) {
              impl->set(in.provider, in.certificates, std::move(result));
            }),
-       BindOperation<GetInput, Info>(
-           "get", [impl](GetInput in, AsyncResult<Info> result, const Activation&) {
+       BindOperation<ProviderInput, Info>(
+           "get", [impl](ProviderInput in, AsyncResult<Info> result, const Activation&) {
              impl->get(in.provider, std::move(result));
            })}});
 }
