@@ -36,7 +36,8 @@ using Kestrel::Common::StrakeLumo::ErrorsTracker;
 using Kestrel::Common::StrakeLumo::TrafficTracker;
 
 void ReportRuntimeInitFailure(const std::exception& e) {
-  std::string line = std::string("Initializing strake failed: ") + e.what() + "\n";
+  std::string line =
+      std::string("Initializing strake failed: ") + Groundwork::EscapeForLog(e.what()) + "\n";
   fputs(line.c_str(), stderr);
   fflush(stderr);
 }

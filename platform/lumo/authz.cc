@@ -151,13 +151,13 @@ void AsyncAuthzFilter::Invoke(Core::CallPtr call, Core::Completion completion) {
   const Authn::AuthenticationResultPtr& caller = call->activation.authData;
   if (caller == nullptr) {
     LUMO_LOG(logger_, Log::kDebug)
-        << "Unauthenticated call to " << Log::SafeForLog(call->method) << "\n";
+        << "Unauthenticated call to " << call->method << "\n";
     completion.Complete(Core::MethodResult::Error(Core::UnauthenticatedError()));
     return;
   }
   const std::vector<std::string>* required = info_->RequiredEntitlements(call->method);
   if (required == nullptr || !checker_->HasAnyEntitlement(*caller, *required)) {
-    LUMO_LOG(logger_, Log::kDebug) << "Call to " << Log::SafeForLog(call->method) << " by "
+    LUMO_LOG(logger_, Log::kDebug) << "Call to " << call->method << " by "
                                    << caller->username << " is not authorized\n";
     completion.Complete(Core::MethodResult::Error(Core::UnauthorizedError(call->method)));
     return;

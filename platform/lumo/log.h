@@ -34,16 +34,6 @@ class Logger {
   virtual std::unique_ptr<LogRecord> CreateRecord(int level) = 0;
 };
 
-// `text` with every control character replaced by '?', for log lines that
-// quote what a caller sent.
-inline std::string SafeForLog(std::string_view text) {
-  std::string out(text);
-  for (char& c : out) {
-    if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f) c = '?';
-  }
-  return out;
-}
-
 }  // namespace Lumo::Log
 
 // Streams one framework log message; the operands are not evaluated when the

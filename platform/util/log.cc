@@ -88,6 +88,25 @@ bool HasCustomLogSink() { return gSink.load(std::memory_order_acquire) != nullpt
 
 void SetLogThreadName(std::string name) { tThreadName = std::move(name); }
 
+std::string EscapeForLog(std::string_view text) {
+  static constexpr char kHex[] = "0123456789abcdef";
+  std::string out;
+  out.reserve(text.size());
+  for (char c : text) {
+    const auto byte = static_cast<unsigned char>(c);
+    if (c == '\\') {
+      out += "\\\\";
+    } else if (byte < 0x20 || byte >= 0x7f) {
+      out += "\\x";
+      out.push_back(kHex[byte >> 4]);
+      out.push_back(kHex[byte & 0xf]);
+    } else {
+      out.push_back(c);
+    }
+  }
+  return out;
+}
+
 std::string FormatLogLine(int level, std::string_view text) {
   std::string stamp = FormatUtcMillis(Hostinfo_GetTimeOfDay());
   std::string thread = tThreadName;
@@ -126,6 +145,12 @@ void Log_LevelV(int level, const char* fmt, va_list args) {
     vsnprintf(text.data(), text.size(), fmt, args);
     text.resize(static_cast<size_t>(n));
   }
+  // One record, one line: the line feed that ends it stays, everything else
+  // is escaped.
+  const bool lineEnd = !text.empty() && text.back() == '\n';
+  if (lineEnd) text.pop_back();
+  text = Groundwork::EscapeForLog(text);
+  if (lineEnd) text.push_back('\n');
   if (auto* sink = Groundwork::gSink.load(std::memory_order_acquire)) {
     sink->Write(level, text);
   } else {

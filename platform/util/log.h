@@ -9,6 +9,11 @@
 // Every record is formatted completely and handed to the sink in one piece;
 // the default sink emits it with a single write(2) to standard error, so lines
 // of concurrent threads never interleave. All functions are thread-safe.
+//
+// A record is one line: whatever text it quotes (a caller's provider name, a
+// stored value, a key server's message) is passed through EscapeForLog as
+// the record is made, so no text can end the line early and forge a record
+// of its own.
 #pragma once
 
 #include <cstdarg>
@@ -52,6 +57,11 @@ bool HasCustomLogSink();
 
 // Names the calling thread in log prefixes (default: its kernel thread id).
 void SetLogThreadName(std::string name);
+
+// `text` with every byte outside printable ASCII (control characters, DEL
+// and bytes of 0x80 and above) written as "\xNN" and backslashes doubled,
+// so the result is one line of plain text that still shows what was there.
+std::string EscapeForLog(std::string_view text);
 
 // Formats one standard-error line: UTC time with milliseconds, "zyrd[pid]",
 // the level name, the thread and the text (a line feed is added if missing).

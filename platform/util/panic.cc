@@ -43,11 +43,11 @@ void Panic(const char* fmt, ...) {
   // the log sees why the process stopped; standard error gets it as well in
   // case the log is off or redirected.
   bool logOff = Groundwork::GetLogThreshold() == Groundwork::kLogOff;
-  Log_Level(0, "%s", msg);
+  Log_Level(1, "%s", msg);
   if (!logOff && !Groundwork::HasCustomLogSink()) abort();
-  std::string line = "PANIC: ";
-  line += msg;
-  if (line.back() != '\n') line.push_back('\n');
+  std::string text = msg;
+  if (!text.empty() && text.back() == '\n') text.pop_back();
+  std::string line = "PANIC: " + Groundwork::EscapeForLog(text) + "\n";
   ssize_t ignored = ::write(STDERR_FILENO, line.data(), line.size());
   (void)ignored;
   abort();

@@ -65,6 +65,29 @@ TEST(LogRecords, FormattedLineCarriesPrefixAndOneLineFeedAndIsNeverTruncated) {
   Groundwork::SetLogThreadName("");
 }
 
+// Quoted text cannot end a record early: control characters, DEL, bytes
+// above ASCII and backslashes are escaped; only the record's own line feed
+// stays. A panic is a critical record, not a key operation's.
+TEST(LogRecords, QuotedTextStaysOnOneLine) {
+  ZyrdTest::LogCapture capture;
+  Log_Level(3, "provider %s not found\n", "p1\nFAKE\r\x1b[31m\\x0a\xc3\xa9\x7f");
+  ASSERT_EQ(capture.Lines().size(), 1u);
+  EXPECT_EQ(capture.Lines()[0].text,
+            "provider p1\\x0aFAKE\\x0d\\x1b[31m\\\\x0a\\xc3\\xa9\\x7f not found\n");
+  struct LevelToStderr : Groundwork::LogSink {
+    void Write(int level, std::string_view text) override {
+      fprintf(stderr, "level %d: %.*s", level, static_cast<int>(text.size()), text.data());
+    }
+  };
+  EXPECT_DEATH(
+      {
+        static LevelToStderr sink;
+        Groundwork::SetLogSink(&sink);
+        Panic("boom\n");
+      },
+      "level 1: boom");
+}
+
 // Concurrent writers to standard error: every line that arrives is whole.
 TEST(LogRecords, ConcurrentStderrLinesDoNotInterleave) {
   int fds[2];
