@@ -139,10 +139,11 @@ Lumo::Provider::ApiProviderPtr CreateLocalProvider(Lumo::Executor executor,
     interfaces.push_back(std::move(iface));
   for (auto& iface : Metadata::AuthnInterfaces(authn)) interfaces.push_back(std::move(iface));
 
-  Lumo::Provider::ApiProviderPtr provider = std::make_shared<Lumo::Provider::AsyncLocalProvider>(
-      executor, std::move(interfaces), metamodel);
-  provider = std::make_shared<Lumo::Authz::Filter::AsyncAuthzFilter>(
-      provider, authzInfo, std::make_shared<OrnaToken::Authz::JwtEntitlementCheckerImpl>(), logger);
+  auto local = std::make_shared<Lumo::Provider::AsyncLocalProvider>(executor, std::move(interfaces),
+                                                                    metamodel);
+  Lumo::Provider::ApiProviderPtr provider = std::make_shared<Lumo::Authz::Filter::AsyncAuthzFilter>(
+      local, authzInfo, std::make_shared<OrnaToken::Authz::JwtEntitlementCheckerImpl>(), logger,
+      [local](const std::string& method) { return local->HasOperation(method); });
 
   // Token handlers, outermost first; wrapped from the last to the first.
   std::vector<std::shared_ptr<Lumo::Authn::AuthnHandler>> handlers = {

@@ -137,11 +137,12 @@ namespace Filter {
 AsyncAuthzFilter::AsyncAuthzFilter(Provider::ApiProviderPtr next,
                                    std::shared_ptr<const AuthzInfo> info,
                                    std::shared_ptr<const EntitlementChecker> checker,
-                                   std::shared_ptr<Log::Logger> logger)
+                                   std::shared_ptr<Log::Logger> logger, ServedPredicate isServed)
     : next_(std::move(next)),
       info_(std::move(info)),
       checker_(std::move(checker)),
-      logger_(std::move(logger)) {}
+      logger_(std::move(logger)),
+      isServed_(std::move(isServed)) {}
 
 void AsyncAuthzFilter::Invoke(Core::CallPtr call, Core::Completion completion) {
   if (info_->NeedsNoAuthentication(call->method)) {
@@ -150,15 +151,18 @@ void AsyncAuthzFilter::Invoke(Core::CallPtr call, Core::Completion completion) {
   }
   const Authn::AuthenticationResultPtr& caller = call->activation.authData;
   if (caller == nullptr) {
-    LUMO_LOG(logger_, Log::kDebug)
-        << "Unauthenticated call to " << call->method << "\n";
+    LUMO_LOG(logger_, Log::kDebug) << "Unauthenticated call to " << call->method << "\n";
     completion.Complete(Core::MethodResult::Error(Core::UnauthenticatedError()));
     return;
   }
   const std::vector<std::string>* required = info_->RequiredEntitlements(call->method);
+  if (required == nullptr && isServed_ && !isServed_(call->method)) {
+    next_->Invoke(std::move(call), std::move(completion));  // answers operation_not_found
+    return;
+  }
   if (required == nullptr || !checker_->HasAnyEntitlement(*caller, *required)) {
-    LUMO_LOG(logger_, Log::kDebug) << "Call to " << call->method << " by "
-                                   << caller->username << " is not authorized\n";
+    LUMO_LOG(logger_, Log::kDebug)
+        << "Call to " << call->method << " by " << caller->username << " is not authorized\n";
     completion.Complete(Core::MethodResult::Error(Core::UnauthorizedError(call->method)));
     return;
   }

@@ -2,6 +2,7 @@
 // the others need, and the filter that applies those rules to each call.
 #pragma once
 
+#include <functional>
 #include <istream>
 #include <map>
 #include <memory>
@@ -72,12 +73,17 @@ namespace Filter {
 // caller is authenticated and holds one of the operation's entitlements.
 // Otherwise completes it with "unauthenticated" (no caller) or "unauthorized"
 // (a caller without the entitlement). An operation without any rule is
-// refused the same way: nothing is callable unless the metadata says so.
+// refused the same way: nothing is callable unless the metadata says so;
+// only a method that nothing serves (`isServed` false) is handed on for an
+// authenticated caller, so that it learns the operation does not exist.
 class AsyncAuthzFilter : public Provider::ApiProvider {
  public:
+  using ServedPredicate = std::function<bool(const std::string& method)>;
+
+  // Without `isServed`, every method counts as served.
   AsyncAuthzFilter(Provider::ApiProviderPtr next, std::shared_ptr<const AuthzInfo> info,
                    std::shared_ptr<const EntitlementChecker> checker,
-                   std::shared_ptr<Log::Logger> logger);
+                   std::shared_ptr<Log::Logger> logger, ServedPredicate isServed = nullptr);
 
   void Invoke(Core::CallPtr call, Core::Completion completion) override;
 
@@ -86,6 +92,7 @@ class AsyncAuthzFilter : public Provider::ApiProvider {
   std::shared_ptr<const AuthzInfo> info_;
   std::shared_ptr<const EntitlementChecker> checker_;
   std::shared_ptr<Log::Logger> logger_;
+  ServedPredicate isServed_;
 };
 
 }  // namespace Filter

@@ -92,7 +92,9 @@ TEST_F(ApiProviderTest, CallsAndTheirOutcomesThroughTheWholeChain) {
       {"com.tarsel.orna.kms.status.get", "{}", attest,
        R"({"output":{"health":"HEALTHY","details":"","messages":[]}})"},
       {"com.tarsel.orna.kms.providers.list", "{}", attest, e + "unauthorized"},
-      {"com.tarsel.orna.kms.nothing.here", "{}", admin, e + "unauthorized"},
+      {"com.tarsel.orna.kms.nothing.here", "{}", admin, e + "operation_not_found"},
+      {"com.tarsel.orna.kms.nothing.here", "{}", attest, e + "operation_not_found"},
+      {"com.tarsel.orna.kms.nothing.here", "{}", "", e + "unauthenticated"},
       {ops + "generate_key", R"({"provider":"p1","keysize":32})", attest,
        "Invalid params: field 'keySize': missing"},
       // Metadata and introspection need no token.

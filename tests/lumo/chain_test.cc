@@ -94,8 +94,23 @@ TEST(LocalProviderTest, DispatchesByFullMethodNameThroughTheExecutor) {
       0u);
 }
 
-// Which calls the filter admits under the daemon's metadata is shown by the
-// API provider's tests.
+// A served operation without a rule is refused; one that nothing serves is
+// handed on (the local provider answers that it does not exist). Which
+// calls the filter admits under the daemon's metadata is shown by the API
+// provider's tests.
+TEST(AuthzFilterTest, OnlyUnservedOperationsWithoutRulePassToTheProvider) {
+  auto terminal = std::make_shared<Terminal>();
+  Lumo::Authz::Filter::AsyncAuthzFilter filter(
+      terminal, std::make_shared<Lumo::Authz::AuthzInfo>(),
+      std::make_shared<OrnaToken::Authz::JwtEntitlementCheckerImpl>(), nullptr,
+      [](const std::string& method) { return method == "a.b.served"; });
+  auto caller = Caller("root", {"@ORNA+KMS_ADMIN"});
+  EXPECT_EQ(Call(filter, "a.b.served", caller), "com.tarsel.lumo.std.errors.unauthorized");
+  EXPECT_EQ(Call(filter, "a.b.gone", caller), R"(output:"a.b.gone")");
+  EXPECT_EQ(Call(filter, "a.b.gone"), "com.tarsel.lumo.std.errors.unauthenticated");
+  EXPECT_EQ(terminal->calls, 1);
+}
+
 TEST(AuthzInfoTest, StartsWithExactlyTheThirtySixBuiltInOperations) {
   Lumo::Authz::AuthzInfo info;
   EXPECT_EQ(info.OperationsForScheme(Lumo::Authz::AuthzInfo::kNoAuthenticationScheme).size(), 36u);
