@@ -93,6 +93,13 @@ bool Endpoint::Start() {
 
   work_.emplace(io_.get_executor());
   auto& pool = Strake::Service::GetApp()->GetThreadPool();
+  // Each worker runs the I/O loop for good: a pool smaller than that would
+  // leave some of them waiting for ever.
+  const size_t before = pool.RaiseMaxThreads(kWorkerCount);
+  if (before < static_cast<size_t>(kWorkerCount)) {
+    Log_Level(3, "Thread pool raised from %zu to %d threads, one for each HTTP worker\n", before,
+              kWorkerCount);
+  }
   for (int i = 0; i < kWorkerCount; ++i) {
     pool.Enqueue([workers = workers_] { workers->Run(); });
   }

@@ -1,11 +1,25 @@
 #include "platform/runtime/thread_pool.h"
 
+#include <algorithm>
+
 #include "platform/util/log.h"
 
 namespace Strake::Service {
 
 ThreadPool::ThreadPool(size_t maxThreads, std::string threadNamePrefix)
-    : maxThreads_(maxThreads == 0 ? 1 : maxThreads), prefix_(std::move(threadNamePrefix)) {}
+    : prefix_(std::move(threadNamePrefix)), maxThreads_(maxThreads == 0 ? 1 : maxThreads) {}
+
+size_t ThreadPool::MaxThreads() const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  return maxThreads_;
+}
+
+size_t ThreadPool::RaiseMaxThreads(size_t threads) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  const size_t before = maxThreads_;
+  maxThreads_ = std::max(maxThreads_, threads);
+  return before;
+}
 
 ThreadPool::~ThreadPool() {
   {

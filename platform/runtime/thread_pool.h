@@ -23,14 +23,17 @@ class ThreadPool {
 
   void Enqueue(std::function<void()> task);
 
-  size_t MaxThreads() const { return maxThreads_; }
+  size_t MaxThreads() const;
+  // Raises the bound to at least `threads` (for callers whose tasks must
+  // all run at once); returns the bound before.
+  size_t RaiseMaxThreads(size_t threads);
 
  private:
   void Worker(size_t index);
 
-  const size_t maxThreads_;
   const std::string prefix_;
-  std::mutex mutex_;
+  mutable std::mutex mutex_;
+  size_t maxThreads_;  // guarded by mutex_
   std::condition_variable cv_;
   std::deque<std::function<void()>> queue_;
   std::vector<std::thread> threads_;

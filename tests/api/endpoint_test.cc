@@ -5,9 +5,13 @@
 
 #include <gtest/gtest.h>
 
+#include <condition_variable>
 #include <cstdlib>
+#include <mutex>
+#include <thread>
 
 #include "daemon/logger.h"
+#include "platform/runtime/app.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/raw_http_client.h"
 
@@ -45,6 +49,42 @@ TEST(EndpointTest, ServesBothFamiliesOnOnePortUntilStopped) {
   endpoint.Stop();
   endpoint.Stop();
   EXPECT_EQ(log.Count("Failed to listen"), 0u);
+}
+
+// A pool set smaller than the workers still runs all five at once: five
+// requests that each wait for the others all get through.
+TEST(EndpointTest, EveryWorkerRunsWhateverThePoolSize) {
+  ZyrdTest::LogCapture log;
+  auto config = Strake::Service::CreateScratchConfig();
+  config->SetInt("strake/threadPool/maxThreads", 2);
+  try {
+    Strake::Service::InitApp(config, "/nonexistent/config.xml");
+  } catch (const std::exception&) {
+  }
+  std::mutex mutex;
+  std::condition_variable cv;
+  int arrived = 0;
+  boost::asio::io_context io;
+  Zyrd::ZyrApi::Endpoint endpoint(
+      0, io,
+      [&](auto, auto done) {
+        std::unique_lock<std::mutex> lock(mutex);
+        ++arrived;
+        cv.notify_all();
+        bool all = cv.wait_for(lock, std::chrono::seconds(5), [&] { return arrived >= 5; });
+        done({all ? "all" : "short", ""});
+      },
+      std::make_shared<Zyrd::ZyrApi::LumoLoggerWrapper>(&Log_Level));
+  ASSERT_TRUE(endpoint.Start());
+  EXPECT_EQ(log.Count("Thread pool raised from 2 to 5 threads"), 1u);
+  std::vector<std::thread> clients;
+  std::vector<std::string> answers(5);
+  for (int i = 0; i < 5; ++i) {
+    clients.emplace_back([&, i] { answers[i] = Served("127.0.0.1", endpoint.Port()); });
+  }
+  for (auto& t : clients) t.join();
+  EXPECT_EQ(answers, std::vector<std::string>(5, "all"));
+  endpoint.Stop();
 }
 
 TEST(HttpPortFromEnvironment, TakesAPortNumberOnly) {
