@@ -6,8 +6,11 @@
 #include <charconv>
 #include <cstring>
 #include <fstream>
+#include <limits>
 #include <sstream>
 #include <stdexcept>
+#include <string_view>
+#include <utility>
 
 namespace Strake::Service {
 namespace {
@@ -29,7 +32,62 @@ void MergeInto(boost::property_tree::ptree& dst, const boost::property_tree::ptr
   }
 }
 
-boost::property_tree::ptree ParseConfigRoot(std::istream& in, const std::string& what) {
+// Configuration documents are small and shallow; the XML reader recurses
+// once per level, so deeper documents are refused before it sees them.
+constexpr size_t kMaxNesting = 64;
+constexpr size_t kMaxDocumentSize = 1 << 20;
+
+// The end of the markup that starts at text[i] ('<'): one past its '>',
+// quoted attribute values and comment, CDATA and declaration bodies
+// skipped; text.size() when it does not end.
+size_t EndOfMarkup(std::string_view text, size_t i) {
+  for (auto [open, close] : {std::pair<std::string_view, std::string_view>{"<!--", "-->"},
+                             {"<![CDATA[", "]]>"},
+                             {"<?", "?>"}}) {
+    if (text.substr(i).starts_with(open)) {
+      size_t end = text.find(close, i + open.size());
+      return end == std::string_view::npos ? text.size() : end + close.size();
+    }
+  }
+  char quote = 0;
+  for (size_t j = i + 1; j < text.size(); ++j) {
+    if (quote != 0) {
+      if (text[j] == quote) quote = 0;
+    } else if (text[j] == '"' || text[j] == '\'') {
+      quote = text[j];
+    } else if (text[j] == '>') {
+      return j + 1;
+    }
+  }
+  return text.size();
+}
+
+// Throws when elements nest deeper than kMaxNesting.
+void CheckNesting(std::string_view text, const std::string& what) {
+  size_t depth = 0;
+  for (size_t i = text.find('<'); i != std::string_view::npos; i = text.find('<', i)) {
+    const size_t end = EndOfMarkup(text, i);
+    const std::string_view tag = text.substr(i, end - i);
+    if (tag.starts_with("</")) {
+      if (depth > 0) --depth;
+    } else if (!tag.starts_with("<!") && !tag.starts_with("<?") && !tag.ends_with("/>") &&
+               ++depth > kMaxNesting) {
+      throw std::runtime_error(what + ": elements nest deeper than " + std::to_string(kMaxNesting) +
+                               " levels");
+    }
+    i = end;
+  }
+}
+
+boost::property_tree::ptree ParseConfigRoot(std::istream& stream, const std::string& what) {
+  std::string text(kMaxDocumentSize + 1, '\0');
+  stream.read(text.data(), static_cast<std::streamsize>(text.size()));
+  text.resize(static_cast<size_t>(stream.gcount()));
+  if (text.size() > kMaxDocumentSize) {
+    throw std::runtime_error(what + ": larger than " + std::to_string(kMaxDocumentSize) + " bytes");
+  }
+  CheckNesting(text, what);
+  std::istringstream in(text);
   boost::property_tree::ptree doc;
   try {
     boost::property_tree::read_xml(in, doc,
@@ -52,13 +110,9 @@ void Config::SetString(std::string_view key, std::string value) {
   tree_.put(MakePath(key), std::move(value));
 }
 
-void Config::SetBool(std::string_view key, bool value) {
-  SetString(key, value ? "true" : "false");
-}
+void Config::SetBool(std::string_view key, bool value) { SetString(key, value ? "true" : "false"); }
 
-void Config::SetInt(std::string_view key, int64_t value) {
-  SetString(key, std::to_string(value));
-}
+void Config::SetInt(std::string_view key, int64_t value) { SetString(key, std::to_string(value)); }
 
 bool Config::Has(std::string_view key) const {
   return static_cast<bool>(tree_.get_child_optional(MakePath(key)));
@@ -91,6 +145,12 @@ int64_t Config::GetInt(std::string_view key, int64_t fallback) const {
   const char* end = begin + value->size();
   if (*begin == '+') ++begin;
   auto [ptr, ec] = std::from_chars(begin, end, n);
+  if (ec == std::errc::result_out_of_range && ptr == end) {
+    // A number beyond the 64-bit range counts as the nearest one within it,
+    // so a setting's clamp still applies.
+    return *value->data() == '-' ? std::numeric_limits<int64_t>::min()
+                                 : std::numeric_limits<int64_t>::max();
+  }
   if (ec != std::errc() || ptr != end) return fallback;
   return n;
 }

@@ -52,14 +52,32 @@ TEST(Config, UnusableTextThrowsAndChangesNothingAndBadValuesFallBack) {
     EXPECT_THROW(config->MergeXmlText(bad), std::runtime_error) << bad;
     EXPECT_TRUE(config->GetBool("caching", false)) << bad;
   }
+  // Nesting the reader would recurse into without bound, and a document
+  // larger than any configuration, are refused the same way.
+  std::string nested;
+  for (int i = 0; i < 20000; ++i) nested += "<a>";
+  EXPECT_THROW(config->MergeXmlText("<config>" + nested + "</config>"), std::runtime_error);
+  EXPECT_THROW(config->MergeXmlText("<config><c>" + std::string(2 << 20, 'x') + "</c></config>"),
+               std::runtime_error);
+  // Markup inside comments, attribute values and CDATA is not nesting.
+  config->MergeXmlText(
+      "<config><!-- <a><a><a> --><k>v<![CDATA[<a><a>]]></k><e x=\"<a>\"/><f/></config>");
+  EXPECT_EQ(config->GetString("k", ""), "v<a><a>");
+  EXPECT_TRUE(config->Has("f"));
+
   config->SetString("n", "12x");
   config->SetString("b", "maybe");
   config->SetString("neg", "-5");
   config->SetString("yes", "TRUE");
+  config->SetString("huge", "99999999999999999999");
+  config->SetString("tiny", "-99999999999999999999");
   EXPECT_EQ(config->GetInt("n", 7), 7);
   EXPECT_TRUE(config->GetBool("b", true));
   EXPECT_EQ(config->GetInt("neg", 0), -5);
   EXPECT_TRUE(config->GetBool("yes", false));
+  EXPECT_EQ(config->GetInt("huge", 7), INT64_MAX);  // beyond 64 bits: the bound, not the default
+  EXPECT_EQ(config->GetInt("tiny", 7), INT64_MIN);
+  EXPECT_EQ(Zyrd::Settings::ClampStatusUpdateInterval(config->GetInt("huge", 300)), 3600);
 }
 
 TEST(InitApp, UnreadableFileLeavesDefaultsInForceAndStillInstallsTheApp) {
