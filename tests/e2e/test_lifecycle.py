@@ -16,8 +16,8 @@ STATS = "<config><statsLogIntervalSeconds>%d</statsLogIntervalSeconds></config>"
     (STATS % 100, signal.SIGTERM, 300, None),  # below the minimum
     (STATS % 900, signal.SIGINT, 900, None),
     ("<config><caching>", signal.SIGTERM, 300, "Initializing strake failed: "),
-    ("<config>" + "<a>" * 20000 + "</a>" * 20000 + "</config>", signal.SIGTERM, 300,
-     "Initializing strake failed: "),
+    pytest.param("<config>" + "<a>" * 20000 + "</a>" * 20000 + "</config>", signal.SIGTERM,
+                 300, "Initializing strake failed: ", id="nested-20000-deep"),
 ])
 def test_runs_until_a_signal_and_exits_with_status_zero(tmp_path, start_daemon, text, sig,
                                                         interval, reported):
