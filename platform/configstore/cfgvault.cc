@@ -9,10 +9,13 @@
 // The default database is the daemon's (under ZYRD_ROOT). export prints the
 // export text of every instance of the key; import replaces the stored
 // instances of each key the text covers; list prints one instance id per
-// line; get prints one object as in the export's "objects" list. Exit
+// line; get prints one object as in the export's "objects" list. Only
+// import creates a missing database; the other commands refuse it. Exit
 // status 0 on success, 1 on failure and 2 on a usage error, with a one-line
 // reason on standard error.
 #include <openssl/crypto.h>
+
+#include <unistd.h>
 
 #include <cerrno>
 #include <cstdio>
@@ -85,6 +88,11 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
   bool withInstance = command == "get" || command == "delete";
   if (!withInstance && command != "export" && command != "list") throw Failure{2, kUsage};
   ConfigStoreObjectId id = IdFrom(args, withInstance);
+  // Only import may make a store: reading one that is not there would
+  // create an empty one and pass it off as the real thing.
+  if (access(dbPath.c_str(), F_OK) != 0) {
+    throw Failure{1, "no store at " + dbPath + ": " + std::strerror(errno)};
+  }
   auto store = SqliteConfigStore::Open(dbPath);
 
   if (command == "export") {

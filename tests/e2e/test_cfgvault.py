@@ -4,7 +4,7 @@ import json
 import os
 import subprocess
 
-from harness import BUILD_DIR, write_config
+from harness import BUILD_DIR, seed, write_config
 
 
 def server(name, host):
@@ -78,6 +78,14 @@ def test_list_get_delete_and_usage(tmp_path):
     for args in ([], ["export", "providers"], ["frobnicate"]):
         result = cfgvault(db, *args)
         assert result.returncode == 2 and result.stderr.startswith(b"cfgvault: usage: ")
+    # Reading a store that is not there creates nothing.
+    absent = tmp_path / "absent" / "configstore.db"
+    for args in (["export", "providers", "kms", "orna"], ["list", "providers", "kms", "orna"],
+                 ["get", "providers", "kms", "orna", "p1"]):
+        result = cfgvault(absent, *args)
+        assert result.returncode == 1 and result.stderr.startswith(
+            b"cfgvault: no store at " + str(absent).encode()), result.stderr
+    assert not absent.parent.exists()
 
 
 def test_default_database_is_the_daemons_and_start_up_restores_it(tmp_path, start_daemon):
@@ -93,3 +101,11 @@ def test_default_database_is_the_daemons_and_start_up_restores_it(tmp_path, star
     lines = d.lines()
     restore = next(i for i, l in enumerate(lines) if "Restoring configuration key zyrd_config" in l)
     assert restore < next(i for i, l in enumerate(lines) if "Stats logging interval" in l)
+
+
+def test_seeding_one_kind_of_record_leaves_the_others(tmp_path):
+    seed(tmp_path, {"providers": [{"provider": "p1", "masterKeyId": "k", "servers": []}]})
+    seed(tmp_path, {"attestationCertificate": "PEM"})
+    env = dict(os.environ, ZYRD_ROOT=str(tmp_path))
+    assert cfgvault(None, "list", "providers", "kms", "orna", env=env).stdout == b"p1\n"
+    assert cfgvault(None, "list", "certificate", "attestation", "orna", env=env).stdout == b"\n"
