@@ -221,6 +221,18 @@ std::shared_ptr<SqliteConfigStore> SqliteConfigStore::Open(const std::string& pa
 
 SqliteConfigStore::~SqliteConfigStore() { sqlite3_close_v2(db_); }
 
+SqliteConfigStore::Durability SqliteConfigStore::ReadDurability() {
+  std::lock_guard<std::mutex> lock(mutex_);
+  Durability d;
+  Statement journal(db_, "PRAGMA journal_mode");
+  if (journal.Step()) d.journalMode = std::string(journal.Text(0));
+  Statement synchronous(db_, "PRAGMA synchronous");
+  if (synchronous.Step()) d.synchronous = synchronous.Int(0);
+  Statement secureDelete(db_, "PRAGMA secure_delete");
+  if (secureDelete.Step()) d.secureDelete = secureDelete.Int(0) != 0;
+  return d;
+}
+
 ConfigStoreObjectPtr SqliteConfigStore::GetObject(const ConfigStoreObjectId& id) {
   CheckTopLevelId(id);
   std::lock_guard<std::mutex> lock(mutex_);

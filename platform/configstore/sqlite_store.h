@@ -42,6 +42,14 @@ class SqliteConfigStore final : public ConfigStore {
 
   const std::string& Path() const { return path_; }
 
+  // The connection's durability settings as SQLite reports them.
+  struct Durability {
+    std::string journalMode;  // "wal"
+    int synchronous = 0;      // 2 = FULL
+    bool secureDelete = false;
+  };
+  Durability ReadDurability();
+
   ConfigStoreObjectPtr GetObject(const ConfigStoreObjectId& id) override;
   void WriteObject(const ConfigStoreObjectPtr& object, int options) override;
   void UpdateObject(const ConfigStoreObjectPtr& object, int options) override;

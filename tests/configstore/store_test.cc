@@ -54,8 +54,12 @@ TEST_F(StoreTest, FilterGivesEveryInstanceOfTheKeyInInstanceOrder) {
                ConfigStoreException);
 }
 
-TEST_F(StoreTest, DatabaseIsPrivateAndSharedBetweenConcurrentConnections) {
-  Store();
+TEST_F(StoreTest, DatabaseIsPrivateDurableAndSharedBetweenConcurrentConnections) {
+  // A change that returned has reached the disk; a deleted one is overwritten.
+  const auto durability = Store().ReadDurability();
+  EXPECT_EQ(durability.journalMode, "wal");
+  EXPECT_EQ(durability.synchronous, 2);  // FULL
+  EXPECT_TRUE(durability.secureDelete);
   struct stat st;
   ASSERT_EQ(stat(DbPath().c_str(), &st), 0);
   EXPECT_EQ(st.st_mode & 0777, 0600u);

@@ -9,6 +9,7 @@ import time
 
 import jwt
 import pytest
+from cryptography.hazmat.primitives.ciphers.aead import AESGCM
 
 from harness import (audit_records, audited_call, first_message, free_port, make_attestation_key,
                      mint, start_seeded)
@@ -37,7 +38,8 @@ def env(kmip_server, tmp_path_factory, request):
                                                      [("dead", free_port()), live]),
                                             provider("deact", deact, [live])],
                               "attestationCertificate": cert}, request)
-    env.__dict__.update(key=key_path, token=mint(key_path), kmip=kmip_server, deact=deact)
+    env.__dict__.update(key=key_path, token=mint(key_path), kmip=kmip_server, deact=deact,
+                        active=active)
     return env
 
 
@@ -61,6 +63,23 @@ def test_generate_then_decrypt_gives_the_same_key(env):
                           {"provider": "p1", "wrappedKey": generated["wrappedKey"]})
     assert name is None and response["result"]["output"]["key"] == generated["key"], response
     assert audit_records(env.root)[-1]["object"] == KEY_OPS.rstrip(".") + ":decrypt"
+
+
+def test_the_wrapped_key_opens_with_the_key_servers_master_key(env):
+    # An oracle independent of the daemon: the master key's bytes from the
+    # key server's own client, and another AES-GCM implementation.
+    name, response = generate(env, "p1")
+    assert name is None, response
+    prefix, version, key_id, iv, tag, ciphertext = response["result"]["output"]["wrappedKey"].split(
+        ".")
+
+    def unb64(text):
+        return base64.urlsafe_b64decode(text + "=" * (-len(text) % 4))
+
+    assert (prefix, version, unb64(key_id).decode()) == ("zyrwk", "v1", env.active)
+    master = bytes.fromhex(env.kmip.admin(("get", env.active))[0])
+    plain = AESGCM(master).decrypt(unb64(iv), unb64(ciphertext) + unb64(tag), None)
+    assert base64.b64encode(plain).decode() == response["result"]["output"]["key"]
 
 
 def test_failover_to_the_second_server_logs_the_first_once(env):

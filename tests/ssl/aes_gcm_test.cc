@@ -4,6 +4,8 @@
 
 #include <set>
 
+#include "tests/support/hex.h"
+
 namespace {
 
 using Kestrel::Common::SslUtils::AesGcmDecrypt;
@@ -19,6 +21,31 @@ Sealed Seal(const std::vector<uint8_t>& pt, const std::vector<uint8_t>& key) {
   Sealed s;
   EXPECT_TRUE(AesGcmEncrypt(pt, key, {}, s.iv, s.ct, s.tag));
   return s;
+}
+
+// Known answers from the GCM specification (test cases 3 and 14): the
+// sealing is AES-GCM itself, not merely something that inverts itself.
+TEST(AesGcm, KnownAnswers) {
+  using ZyrdTest::Unhex;
+  const struct {
+    const char *key, *iv, *plaintext, *ciphertext, *tag;
+  } cases[] = {
+      {"feffe9928665731c6d6a8f9467308308", "cafebabefacedbaddecaf888",
+       "d9313225f88406e5a55909c5aff5269a86a7a9531534f7da2e4c303d8a318a72"
+       "1c3c0c95956809532fcf0e2449a6b525b16aedf5aa0de657ba637b391aafd255",
+       "42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e"
+       "21d514b25466931c7d8f6a5aac84aa051ba30b396a0aac973d58e091473f5985",
+       "4d5c2af327cd64a62cf35abd2ba6fab4"},
+      {"0000000000000000000000000000000000000000000000000000000000000000",
+       "000000000000000000000000", "00000000000000000000000000000000",
+       "cea7403d4d606b6e074ec5d3baf39d18", "d0d1c8a799996bf0265b98b5d48ab919"},
+  };
+  for (const auto& c : cases) {
+    Groundwork::SecureBytes plain;
+    ASSERT_TRUE(
+        AesGcmDecrypt(Unhex(c.ciphertext), Unhex(c.key), Unhex(c.iv), {}, Unhex(c.tag), plain));
+    EXPECT_EQ(ZyrdTest::Hex(plain), c.plaintext);
+  }
 }
 
 // Every encryption has a fresh IV; other key lengths fail with empty outputs.
