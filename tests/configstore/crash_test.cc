@@ -7,6 +7,8 @@
 
 #include <chrono>
 #include <cstdint>
+#include <cstdio>
+#include <cstdlib>
 #include <map>
 #include <random>
 #include <thread>
@@ -70,7 +72,14 @@ namespace {
 TEST(CrashSafety, KilledWriterKeepsEveryReturnedWriteAndNothingTorn) {
   TempDir dir;
   const std::string path = dir / "zyrd/configstore.db";
-  std::mt19937 rng(std::random_device{}());
+  // ZYRD_CRASH_SEED replays a run; the seed of each run is printed.
+  const char* seedText = std::getenv("ZYRD_CRASH_SEED");
+  const uint32_t seed = seedText != nullptr
+                            ? static_cast<uint32_t>(std::strtoul(seedText, nullptr, 10))
+                            : std::random_device{}();
+  std::printf("crash test seed: ZYRD_CRASH_SEED=%u\n", seed);
+  SCOPED_TRACE("ZYRD_CRASH_SEED=" + std::to_string(seed));
+  std::mt19937 rng(seed);
   uint32_t acked = 0;  // writes that returned, over all rounds
 
   for (int round = 0; round < kRounds; ++round) {

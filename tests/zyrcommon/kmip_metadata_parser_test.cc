@@ -82,14 +82,25 @@ TEST(WrappedKeyText, RejectsMalformedTexts) {
 
 // A cut that ends on a complete ciphertext group may still parse as a shorter
 // canonical text, but never as the original.
-TEST(WrappedKeyText, EveryTruncationIsRejected) {
-  std::string text = Wrap("master-key-1", Bytes(12, 3), Bytes(16, 9), Bytes(32, 5));
+// A text cut anywhere up to the ciphertext is refused; cut within the
+// ciphertext it may still parse (the tag then refuses it), but never with a
+// key id, IV or tag other than the ones it was made with.
+TEST(WrappedKeyText, TruncationsNeverYieldOtherKeyMaterialNames) {
+  const std::string text = Wrap("master-key-1", Bytes(12, 3), Bytes(16, 9), Bytes(32, 5));
+  const size_t ciphertextStart = text.rfind('.') + 1;
   KmipMetadataParser parser;
+  size_t parsed = 0;
   for (size_t n = 0; n < text.size(); ++n) {
-    if (parser.Parse(text.substr(0, n))) {
-      EXPECT_NE(Item(parser.GetCiphertext(), parser.GetCiphertextSize()), Bytes(32, 5)) << n;
-    }
+    if (!parser.Parse(text.substr(0, n))) continue;
+    ++parsed;
+    EXPECT_GE(n, ciphertextStart);
+    EXPECT_EQ(std::string(reinterpret_cast<const char*>(parser.GetKeyId()), parser.GetKeyIdSize()),
+              "master-key-1");
+    EXPECT_EQ(Item(parser.GetIv(), parser.GetIvSize()), Bytes(12, 3));
+    EXPECT_EQ(Item(parser.GetMac(), parser.GetMacSize()), Bytes(16, 9));
+    EXPECT_LT(parser.GetCiphertextSize(), 32u);
   }
+  EXPECT_GT(parsed, 0u);  // some shorter ciphertexts are well-formed
 }
 
 }  // namespace
