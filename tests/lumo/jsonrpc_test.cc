@@ -95,12 +95,19 @@ TEST_F(JsonRpcTest, MalformedRequestsGetTheJsonRpcErrorCodes) {
 }
 
 TEST_F(JsonRpcTest, BearerTokenBecomesTheSecurityContextAndSecretsAreWiped) {
-  Send(R"({"jsonrpc":"2.0","id":1,"method":"ok.op"})", "bEaReR  tok.en ");
+  const std::string body = R"({"jsonrpc":"2.0","id":1,"method":"ok.op"})";
+  const std::string header = "bEaReR  tok.en/with-a-long-tail";
+  Send(body, header);
   const auto& context = provider_->last->activation.securityContext;
   EXPECT_EQ(context.scheme, Lumo::Core::SecurityContext::kOAuthScheme);
-  EXPECT_EQ(context.accessToken.view(), "tok.en");
+  EXPECT_EQ(context.accessToken.view(), "tok.en/with-a-long-tail");
+  // Overwritten where they lie, not merely emptied: the buffers keep their
+  // places, so their bytes can be looked at.
   EXPECT_TRUE(call_->authorization.empty());
   EXPECT_TRUE(call_->body.empty());
+  EXPECT_EQ(std::string_view(call_->body.data(), body.size()), std::string(body.size(), '\0'));
+  EXPECT_EQ(std::string_view(call_->authorization.data(), header.size()),
+            std::string(header.size(), '\0'));
 
   for (const char* header : {"", "Basic dXNlcg==", "Bearer", "Bearertok"}) {
     Send(R"({"jsonrpc":"2.0","id":1,"method":"ok.op"})", header);
