@@ -7,9 +7,13 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
+#include <condition_variable>
 #include <cstring>
 #include <memory>
+#include <mutex>
+#include <thread>
 
 #include "platform/kmip/qlkmipsimple.h"
 
@@ -55,20 +59,77 @@ struct AddrInfoFree {
   void operator()(addrinfo* a) const { freeaddrinfo(a); }
 };
 
-}  // namespace
+using AddrInfoPtr = std::unique_ptr<addrinfo, AddrInfoFree>;
 
-Failure ConnectTcp(const Endpoint& to, const Deadline& deadline, UniqueFd* out) {
+std::atomic<LookupFunction> gLookup{&::getaddrinfo};
+std::atomic<int> gPendingLookups{0};
+
+// One lookup on a helper thread; whoever comes last (the lookup, or a caller
+// that gave up waiting) frees what the other left.
+struct Lookup {
+  std::mutex mutex;
+  std::condition_variable done;
+  bool finished = false;
+  bool abandoned = false;
+  int rc = 0;
+  addrinfo* found = nullptr;
+};
+
+Failure Resolve(const Endpoint& to, const Deadline& deadline, AddrInfoPtr& out) {
   addrinfo hints{};
   hints.ai_family = AF_UNSPEC;
   hints.ai_socktype = SOCK_STREAM;
   hints.ai_protocol = IPPROTO_TCP;
+  const std::string port = std::to_string(to.port);
   addrinfo* found = nullptr;
-  std::string port = std::to_string(to.port);
-  int rc = getaddrinfo(to.host.c_str(), port.c_str(), &hints, &found);
-  if (rc != 0) {
-    return {QLC_E_COMMUNICATION, "cannot resolve '" + to.host + "': " + gai_strerror(rc)};
+  hints.ai_flags = AI_NUMERICHOST;
+  if (::getaddrinfo(to.host.c_str(), port.c_str(), &hints, &found) == 0) {
+    out.reset(found);
+    return {};
   }
-  std::unique_ptr<addrinfo, AddrInfoFree> list(found);
+  hints.ai_flags = 0;
+  if (gPendingLookups.fetch_add(1) >= kMaxPendingLookups) {
+    --gPendingLookups;
+    return {QLC_E_COMMUNICATION, "cannot resolve '" + to.host + "': too many lookups pending"};
+  }
+  auto lookup = std::make_shared<Lookup>();
+  std::thread([lookup, host = to.host, port, hints, fn = gLookup.load()] {
+    addrinfo* result = nullptr;
+    const int rc = fn(host.c_str(), port.c_str(), &hints, &result);
+    {
+      std::lock_guard<std::mutex> lock(lookup->mutex);
+      if (lookup->abandoned) {
+        if (rc == 0) freeaddrinfo(result);
+      } else {
+        lookup->rc = rc;
+        lookup->found = rc == 0 ? result : nullptr;
+        lookup->finished = true;
+      }
+    }
+    lookup->done.notify_all();
+    --gPendingLookups;
+  }).detach();
+
+  std::unique_lock<std::mutex> lock(lookup->mutex);
+  if (!lookup->done.wait_for(lock, std::chrono::milliseconds(deadline.RemainingMs()),
+                             [&] { return lookup->finished; })) {
+    lookup->abandoned = true;
+    return {QLC_E_TIMEOUT, "timed out resolving '" + to.host + "'"};
+  }
+  if (lookup->rc != 0) {
+    return {QLC_E_COMMUNICATION, "cannot resolve '" + to.host + "': " + gai_strerror(lookup->rc)};
+  }
+  out.reset(lookup->found);
+  return {};
+}
+
+}  // namespace
+
+void SetLookupFunction(LookupFunction lookup) { gLookup.store(lookup ? lookup : &::getaddrinfo); }
+
+Failure ConnectTcp(const Endpoint& to, const Deadline& deadline, UniqueFd* out) {
+  AddrInfoPtr list;
+  if (Failure f = Resolve(to, deadline, list)) return f;
   Failure last{QLC_E_COMMUNICATION, "no address for '" + to.host + "'"};
   for (addrinfo* a = list.get(); a != nullptr; a = a->ai_next) {
     UniqueFd fd(

@@ -4,6 +4,8 @@
 // function is thread-safe (no shared state).
 #pragma once
 
+#include <netdb.h>
+
 #include <chrono>
 #include <string>
 
@@ -54,8 +56,21 @@ class UniqueFd {
 Failure WaitReady(int fd, short events, const Deadline& deadline, const std::string& during);
 
 // Resolves `to` and connects a non-blocking socket to the first address
-// (IPv4 or IPv6) that accepts, within the deadline.
+// (IPv4 or IPv6) that accepts, all within the deadline. A host name is
+// looked up on a helper thread, because the system resolver cannot be
+// interrupted: when the deadline passes first, the call fails with the
+// time-out number at once and the lookup finishes (and is discarded) on its
+// own. At most kMaxPendingLookups lookups wait at a time; beyond that a
+// connect fails at once. Addresses in numeric form need no lookup.
 Failure ConnectTcp(const Endpoint& to, const Deadline& deadline, UniqueFd* out);
+
+inline constexpr int kMaxPendingLookups = 64;
+
+// The name lookup ConnectTcp uses, getaddrinfo(3) unless replaced; tests
+// put in a slow one. Set it before connecting, not while connects run.
+using LookupFunction = int (*)(const char* node, const char* service, const ::addrinfo* hints,
+                               ::addrinfo** result);
+void SetLookupFunction(LookupFunction lookup);
 
 // Asks the HTTP proxy on `fd` to open a tunnel to `target`; succeeds on a 2xx
 // answer. Reads exactly the proxy's answer head, nothing beyond.

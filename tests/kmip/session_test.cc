@@ -4,7 +4,9 @@
 
 #include <chrono>
 #include <cstdio>
+#include <thread>
 
+#include "platform/kmip/connection.h"
 #include "tests/kmip/kmip_test_util.h"
 #include "tests/support/kmip_messages.h"
 #include "tests/support/loopback_server.h"
@@ -101,7 +103,6 @@ TEST_F(FakeServerTest, ServerFailuresAndMissingValues) {
   int length = -1;
   EXPECT_EQ(qlc_value_of("Symmetric_Key/Key", r.r, "bs", &bytes, &length), QLC_E_NOT_FOUND);
   EXPECT_TRUE(bytes == nullptr && length == -1);
-
 }
 
 TEST_F(FakeServerTest, MalformedAnswersKeepTheSessionOnlyWhileFramingHolds) {
@@ -247,6 +248,26 @@ TEST(Connect, LocalProblemsHaveTheirOwnNumbers) {
   EXPECT_EQ(session, nullptr);
   int v;  // a failed result has no response to look into
   EXPECT_EQ(qlc_value_of("Versions", r.r, "d", &v), QLC_E_BAD_ARGUMENT);
+}
+
+// A name lookup that hangs costs the session's time-out, not the
+// resolver's: the connect gives up at the deadline and the lookup is left
+// to finish on its own.
+TEST(Connect, AHungLookupIsBoundedByTheTimeOut) {
+  Qlc::SetLookupFunction([](const char*, const char*, const addrinfo*, addrinfo**) {
+    std::this_thread::sleep_for(std::chrono::seconds(10));
+    return EAI_AGAIN;
+  });
+  const auto start = std::chrono::steady_clock::now();
+  Connection slow(Config(ZyrdTest::ClosedPort(), {"ca"}, "client", 1, "kms.example"));
+  const auto waited = std::chrono::steady_clock::now() - start;
+  Qlc::SetLookupFunction(nullptr);
+  EXPECT_EQ(slow.number, QLC_E_TIMEOUT);
+  EXPECT_NE(slow.explanation.find("timed out resolving 'kms.example'"), std::string::npos);
+  EXPECT_LT(waited, std::chrono::seconds(6));
+  // Numeric addresses never wait for a lookup.
+  Connection numeric(Config(ZyrdTest::ClosedPort(), {"ca"}, "client", 1, "::1"));
+  EXPECT_EQ(numeric.number, QLC_E_COMMUNICATION);
 }
 
 TEST(CSurface, NullAndForeignHandlesAreRefused) {
