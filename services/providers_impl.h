@@ -30,7 +30,7 @@ class ProvidersImpl : public AsyncServiceInterface {
   // characters, and a port outside 1..65535. Unset ports are stored as 5696
   // (servers) and 443 (proxy). An existing provider gives already_exists.
   void create(const CreateSpec& spec, ::Lumo::AsyncResult<void> result) override;
-  // Changes what the spec gives; servers, when given, replace the whole
+  // Changes what the request gives; servers, when given, replace the whole
   // list, and a proxy with an empty hostname removes the proxy.
   void update(const std::string& provider, const UpdateSpec& spec,
               ::Lumo::AsyncResult<void> result) override;

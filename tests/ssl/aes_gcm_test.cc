@@ -23,7 +23,7 @@ Sealed Seal(const std::vector<uint8_t>& pt, const std::vector<uint8_t>& key) {
   return s;
 }
 
-// Known answers from the GCM specification (test cases 3 and 14): the
+// Known answers published with GCM (its test cases 3 and 14): the
 // sealing is AES-GCM itself, not merely something that inverts itself.
 TEST(AesGcm, KnownAnswers) {
   using ZyrdTest::Unhex;
