@@ -12,12 +12,11 @@ namespace Zyrd::ZyrApi {
 
 using Messages = std::vector<Lumo::L10n::LocalizableMessage>;
 
-Lumo::Data::ErrorValuePtr MakeError(const Messages& messages);                 // Error, type 0
-Lumo::Data::ErrorValuePtr MakeNotFoundError(const Messages& messages);         // NotFound, 12
+Lumo::Data::ErrorValuePtr MakeError(const Messages& messages);             // Error, type 0
+Lumo::Data::ErrorValuePtr MakeNotFoundError(const Messages& messages);     // NotFound, 12
 Lumo::Data::ErrorValuePtr MakeInvalidArgumentError(const Messages& messages);  // InvalidArgument, 7
-Lumo::Data::ErrorValuePtr MakeUnsupportedError(const Messages& messages);      // Unsupported, 23
-Lumo::Data::ErrorValuePtr MakeUnauthenticatedError(
-    const Messages& messages);  // Unauthenticated, 20
+Lumo::Data::ErrorValuePtr MakeUnsupportedError(const Messages& messages);  // Unsupported, 23
+Lumo::Data::ErrorValuePtr MakeUnauthenticatedError(const Messages& messages);  // Unauthenticated, 20
 
 // Store status -> error: 1 AlreadyExists and 3 NotFound with `messages`; any
 // other status an Error whose only message is

@@ -14,10 +14,10 @@ enum KmsResult : uint32_t {
   MasterKeyUnusableForEncryption = 3,  // Deactivated or Compromised
   MasterKeyUnusable = 4,               // Destroyed or Destroyed Compromised
   MasterKeyLengthUnsupported = 5,
-  CryptoFailure = 6,                 // random bytes, AES-GCM
-  EncodeFailure = 7,                 // Base64
-  MetadataFailure = 8,               // wrapped-key text
-  KeyServerTimeout = 9,              // KMIP library error 105
+  CryptoFailure = 6,     // random bytes, AES-GCM
+  EncodeFailure = 7,     // Base64
+  MetadataFailure = 8,   // wrapped-key text
+  KeyServerTimeout = 9,  // KMIP library error 105
   KeyServerCommunicationError = 10,  // KMIP library error 75
   CertFormatUnknown = 11,
   ServerCertNotRequired = 12,

@@ -17,9 +17,10 @@
 
 #include "kms/kms.h"
 #include "kms/kms_info.h"
-#include "platform/kmip/qlkmipsimple.h"
 #include "platform/util/secure_buffer.h"
 #include "platform/util/userlock.h"
+
+#include "platform/kmip/qlkmipsimple.h"
 
 namespace Zyrd::Kms {
 
@@ -90,8 +91,9 @@ class KmipKms final : public Kms {
   // The KMIP versions server `server` announces. With `alwaysTrustServer`, a
   // server that the configured certificates do not vouch for is retried
   // trusting `remoteCert` alone.
-  KmsResult DiscoverVersions(uint32_t server, bool alwaysTrustServer, const std::string& remoteCert,
-                             std::string& reason, std::vector<std::string>& versions);
+  KmsResult DiscoverVersions(uint32_t server, bool alwaysTrustServer,
+                             const std::string& remoteCert, std::string& reason,
+                             std::vector<std::string>& versions);
 
   // The certificate server `server` presents, fetched without trusting it.
   // Like every operation that takes a server index, OtherFailure for an

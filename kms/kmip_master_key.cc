@@ -18,17 +18,6 @@ using Zyr::KeyProviders::Metadata::KmipMetadataParser;
 constexpr const char* kGetKey = "Get, Object, Id=%s";
 constexpr const char* kGetState = "Get, Attributes, Id=%s, Names=State";
 
-// Base64 of `bytes` into `text` through a wiping buffer.
-bool EncodeSecret(const Groundwork::SecureBytes& bytes, Groundwork::SecureString& text) {
-  size_t size = Base64_EncodedLength(bytes.data(), bytes.size());
-  Groundwork::SecureString buffer;
-  buffer.str().assign(size, '\0');
-  size_t length = 0;
-  if (!Base64_Encode(bytes.data(), bytes.size(), buffer.data(), size, &length)) return false;
-  text.assign(std::string_view(buffer.data(), length));
-  return true;
-}
-
 }  // namespace
 
 KmsResult CheckKeyState(int32_t state, std::string& reason) {
@@ -52,7 +41,8 @@ KmsResult CheckKeyState(int32_t state, std::string& reason) {
   }
 }
 
-KmsResult CheckMasterKey(size_t length, int32_t state, MasterKeyFlags& flags, std::string& reason) {
+KmsResult CheckMasterKey(size_t length, int32_t state, MasterKeyFlags& flags,
+                         std::string& reason) {
   flags = {};
   if (length == 0) {
     reason = "Key not found";
@@ -94,7 +84,8 @@ KmsResult KmipKms::GetKeyState(qlc_session* session, const std::string& keyId, i
 }
 
 KmsResult KmipKms::GetMasterKey(uint32_t server, const std::string& keyId, bool refreshState,
-                                Groundwork::SecureBytes& key, int32_t& state, std::string& reason) {
+                                Groundwork::SecureBytes& key, int32_t& state,
+                                std::string& reason) {
   const char* provider = info_->name.c_str();
   state = kKeyStateUnknown;
   if (!HasServer(server, reason)) return OtherFailure;
@@ -183,12 +174,9 @@ KmsResult KmipKms::GenerateKey(uint32_t server, uint32_t keyLength,
     Log_Level(2, "Generate key failed, %s\n", reason.c_str());
     return CryptoFailure;
   }
-  if (!EncodeSecret(dataKey, plainKey)) {
-    reason = "Failed to encode key";
-    Log_Level(2, "Generate key failed, %s\n", reason.c_str());
-    return EncodeFailure;
-  }
-  if (!KmipMetadataParser::Add(keyId, iv, tag, ciphertext.data(), ciphertext.size(), wrappedKey)) {
+  plainKey = Groundwork::Base64EncodeSecret(dataKey.data(), dataKey.size());
+  if (!KmipMetadataParser::Add(keyId, iv, tag, ciphertext.data(), ciphertext.size(),
+                               wrappedKey)) {
     reason = "Failed to add metadata";
     Log_Level(2, "Generate key failed, %s\n", reason.c_str());
     return MetadataFailure;
@@ -235,11 +223,7 @@ KmsResult KmipKms::Decrypt(uint32_t server, const std::string& wrappedKey,
     Log_Level(2, "Decrypt failed, %s\n", reason.c_str());
     return CryptoFailure;
   }
-  if (!EncodeSecret(plaintext, plainKey)) {
-    reason = "Failed to encode plaintext";
-    Log_Level(2, "Decrypt failed, %s\n", reason.c_str());
-    return EncodeFailure;
-  }
+  plainKey = Groundwork::Base64EncodeSecret(plaintext.data(), plaintext.size());
   Log_Level(0, "Operation : 'Decrypt'\n");
   return Ok;
 }

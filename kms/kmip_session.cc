@@ -14,7 +14,8 @@ namespace {
 
 constexpr const char* kCredentialOptions = ", Options={Authentication={User=%s, Password=%s}}";
 
-void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert, const char* warning) {
+void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert,
+                            const char* warning) {
   if (!Kestrel::Common::SslUtils::StandardizePemCert(cert)) {
     Log_Level(3, "%s", warning);
   }
@@ -27,14 +28,10 @@ void AppendStandardizedCert(Groundwork::SecureString& out, std::string cert, con
 
 KmsResult MapKmipError(int error) {
   switch (error) {
-    case 0:
-      return Ok;
-    case kKmipErrorCommunication:
-      return KeyServerCommunicationError;
-    case kKmipErrorTimeout:
-      return KeyServerTimeout;
-    default:
-      return KmipFailure;
+    case 0: return Ok;
+    case kKmipErrorCommunication: return KeyServerCommunicationError;
+    case kKmipErrorTimeout: return KeyServerTimeout;
+    default: return KmipFailure;
   }
 }
 
@@ -49,7 +46,9 @@ void KmipKms::GetTrustedServerCertificates(std::vector<std::string>& certificate
   certificates = info_->trustedServerCertificates;
 }
 
-void KmipKms::GetClientCert(std::string& certificate) { certificate = info_->clientCertificate; }
+void KmipKms::GetClientCert(std::string& certificate) {
+  certificate = info_->clientCertificate;
+}
 
 int KmipKms::GetServerName(uint32_t server, std::string& name) {
   if (server >= info_->servers.size()) {
@@ -102,8 +101,7 @@ Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
   out.append("User_Trust, Authenticate}");
   if (withTrust) {
     if (!trustedCert.empty()) {
-      AppendStandardizedCert(desc, trustedCert,
-                             "Could not standardize trusted server certificate.\n");
+      AppendStandardizedCert(desc, trustedCert, "Could not standardize trusted server certificate.\n");
     } else {
       for (const auto& cert : info_->trustedServerCertificates) {
         AppendStandardizedCert(desc, cert, "Could not standardize server certificate.\n");
@@ -190,9 +188,9 @@ KmsResult KmipKms::FetchServerCertificate(uint32_t server, std::string& pem, std
               ServerName(server).c_str(), reason.c_str());
     return r;
   }
-  if (!Kestrel::Common::SslUtils::StandardizePemString(
-          Kestrel::Common::SslUtils::kCertificateHeader,
-          Kestrel::Common::SslUtils::kCertificateFooter, pem)) {
+  namespace SslUtils = Kestrel::Common::SslUtils;
+  if (!SslUtils::StandardizePemString(SslUtils::kCertificateHeader, SslUtils::kCertificateFooter,
+                                      pem)) {
     Log_Level(3, "Failed to standardize server certificate of key server %s\n",
               ServerName(server).c_str());
   }

@@ -165,7 +165,8 @@ void KmipKms::Probe(ProbeResult& result) {
         // Each attempt starts from nothing: bytes left by a failed attempt on
         // an earlier server must never pass for the cached key.
         Groundwork::Wipe(result.key);
-        KmsResult r = GetMasterKey(i, info_->masterKeyId, true, result.key, result.state, reason);
+        KmsResult r =
+            GetMasterKey(i, info_->masterKeyId, true, result.key, result.state, reason);
         MasterKeyFlags flags;
         if (r == Ok) {
           std::string checkReason;
@@ -174,8 +175,7 @@ void KmipKms::Probe(ProbeResult& result) {
           result.status.masterKeyFound = flags.found;
           result.status.masterKeyUsable = flags.usable;
           result.status.keySizeSupported = flags.sizeSupported;
-          Log_Level(6,
-                    "Provider %s status update master key found %s usable %s size supported %s\n",
+          Log_Level(6, "Provider %s status update master key found %s usable %s size supported %s\n",
                     provider, flags.found ? "true" : "false", flags.usable ? "true" : "false",
                     flags.sizeSupported ? "true" : "false");
         }

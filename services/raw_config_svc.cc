@@ -12,17 +12,6 @@ namespace {
 
 constexpr const char* kDefaultDateTime = "1970-01-01T00:00:00.000Z";
 
-// Standard Base64 of `bytes`, in memory that wipes itself.
-Groundwork::SecureString EncodeBase64(std::string_view bytes) {
-  Groundwork::SecureString text;
-  const auto* data = reinterpret_cast<const uint8_t*>(bytes.data());
-  text.str().resize(Base64_EncodedLength(data, bytes.size()));
-  size_t length = 0;
-  Base64_Encode(data, bytes.size(), text.data(), text.size(), &length);
-  text.str().resize(length);
-  return text;
-}
-
 struct GetInput {
   std::optional<InfoType> infoType;
 };
@@ -49,7 +38,10 @@ SetInput tag_invoke(json::value_to_tag<SetInput>, const json::value& in) {
 void tag_invoke(json::value_from_tag, json::value& out, const Info& in) {
   json::object& o = out.emplace_object();
   if (in.configuration) {
-    o["configuration"] = EncodeBase64(in.configuration->view()).view();
+    const auto& gz = *in.configuration;
+    o["configuration"] =
+        Groundwork::Base64EncodeSecret(reinterpret_cast<const uint8_t*>(gz.data()), gz.size())
+            .view();
   } else {
     o["configuration"] = nullptr;
   }

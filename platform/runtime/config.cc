@@ -110,9 +110,13 @@ void Config::SetString(std::string_view key, std::string value) {
   tree_.put(MakePath(key), std::move(value));
 }
 
-void Config::SetBool(std::string_view key, bool value) { SetString(key, value ? "true" : "false"); }
+void Config::SetBool(std::string_view key, bool value) {
+  SetString(key, value ? "true" : "false");
+}
 
-void Config::SetInt(std::string_view key, int64_t value) { SetString(key, std::to_string(value)); }
+void Config::SetInt(std::string_view key, int64_t value) {
+  SetString(key, std::to_string(value));
+}
 
 bool Config::Has(std::string_view key) const {
   return static_cast<bool>(tree_.get_child_optional(MakePath(key)));

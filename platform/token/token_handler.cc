@@ -26,11 +26,7 @@ bool DefaultRandom(uint8_t* out, size_t length) {
 
 // Unpadded Base64url of `bytes`.
 Groundwork::SecureString EncodeToken(const Groundwork::SecureBytes& bytes) {
-  Groundwork::SecureString text;
-  text.str().resize(Base64_EncodedLength(bytes.data(), bytes.size()));
-  size_t length = 0;
-  Base64_Encode(bytes.data(), bytes.size(), text.data(), text.size(), &length);
-  text.str().resize(length);
+  Groundwork::SecureString text = Groundwork::Base64EncodeSecret(bytes.data(), bytes.size());
   for (char& c : text.str()) {
     if (c == '+') c = '-';
     if (c == '/') c = '_';

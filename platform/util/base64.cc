@@ -88,15 +88,25 @@ bool Base64_Decode(std::string_view text, Groundwork::SecureBytes* out) {
 }
 
 namespace Groundwork {
+
+SecureString Base64EncodeSecret(const uint8_t* src, size_t length) {
+  SecureString text;
+  text.str().resize(Base64_EncodedLength(src, length));
+  size_t used = 0;
+  Base64_Encode(src, length, text.data(), text.size(), &used);
+  text.str().resize(used);
+  return text;
+}
+
 namespace {
 
-constexpr char kUrlAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_";
+constexpr char kUrlAlphabet[] =
+    "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789-_";
 
 constexpr std::array<int8_t, 256> MakeUrlReverse() {
   std::array<int8_t, 256> table{};
   for (auto& v : table) v = -1;
-  for (int i = 0; i < 64; ++i)
-    table[static_cast<uint8_t>(kUrlAlphabet[i])] = static_cast<int8_t>(i);
+  for (int i = 0; i < 64; ++i) table[static_cast<uint8_t>(kUrlAlphabet[i])] = static_cast<int8_t>(i);
   return table;
 }
 

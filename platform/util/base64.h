@@ -16,7 +16,8 @@ size_t Base64_EncodedLength(const uint8_t* src, size_t length);
 // Encodes `length` bytes of `src` into `dst` (NUL-terminated). Returns false
 // when `dstSize` is too small. `dstLength`, when given, receives the length
 // without the NUL.
-bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize, size_t* dstLength);
+bool Base64_Encode(const uint8_t* src, size_t length, char* dst, size_t dstSize,
+                   size_t* dstLength);
 
 // Decodes standard Base64 text; false on any character outside the alphabet,
 // bad padding or a length that is not a multiple of four.
@@ -25,6 +26,9 @@ bool Base64_Decode(std::string_view text, std::vector<uint8_t>* out);
 bool Base64_Decode(std::string_view text, Groundwork::SecureBytes* out);
 
 namespace Groundwork {
+
+// Standard Base64 of secret bytes, in a string that wipes itself.
+SecureString Base64EncodeSecret(const uint8_t* src, size_t length);
 
 // URL-safe Base64 without padding ('-' and '_' for '+' and '/'), appended to
 // `out`.

@@ -16,8 +16,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   std::string keyId(reinterpret_cast<const char*>(parser.GetKeyId()), parser.GetKeyIdSize());
   std::vector<uint8_t> iv(parser.GetIv(), parser.GetIv() + parser.GetIvSize());
   std::vector<uint8_t> mac(parser.GetMac(), parser.GetMac() + parser.GetMacSize());
-  if (!KmipMetadataParser::Add(keyId, iv, mac, parser.GetCiphertext(), parser.GetCiphertextSize(),
-                               again) ||
+  if (!KmipMetadataParser::Add(keyId, iv, mac, parser.GetCiphertext(),
+                               parser.GetCiphertextSize(), again) ||
       again != text) {
     abort();
   }
