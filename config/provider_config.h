@@ -79,6 +79,8 @@ int ListProviders(std::vector<std::shared_ptr<ProvidersSvc::Summary>>& providers
 // any other failure.
 int GetProviderHosts(const std::string& name, bool withServers, bool withProxy,
                      std::vector<std::string>& hosts, std::string& proxyHost);
+// Appends every host the provider uses: its servers', then its proxy's.
+int GetAllProviderHosts(const std::string& name, std::vector<std::string>& hosts);
 
 // ---- creating and changing ----
 

@@ -229,6 +229,13 @@ int GetProviderHosts(const std::string& name, bool withServers, bool withProxy,
   return kStoreOk;
 }
 
+int GetAllProviderHosts(const std::string& name, std::vector<std::string>& hosts) {
+  std::string proxy;
+  int rc = GetProviderHosts(name, true, true, hosts, proxy);
+  if (rc == kStoreOk && !proxy.empty()) hosts.push_back(proxy);
+  return rc;
+}
+
 bool ReadVouchdPublicKey(std::string& key) {
   std::string certificate;
   try {

@@ -275,13 +275,11 @@ void ProvidersImpl::delete_(const std::string& provider, ::Lumo::AsyncResult<voi
   }
   UserLock::WriteGuard lock(Config::ConfigLock());
   std::vector<std::string> hosts;
-  std::string proxy;
-  int rc = Config::GetProviderHosts(provider, true, true, hosts, proxy);
+  int rc = Config::GetAllProviderHosts(provider, hosts);
   if (rc != Config::kStoreOk) {
     Log_Level(2, "Delete provider %s failed to get ips to update firewall\n", provider.c_str());
     return result.SetError(Zyrd::ZyrApi::MakeProviderStoreError(rc, provider));
   }
-  if (!proxy.empty()) hosts.push_back(proxy);
   rc = Config::DeleteProvider(provider);
   if (rc != Config::kStoreOk) {
     Log_Level(2, "Delete provider %s failed: %d\n", provider.c_str(), rc);

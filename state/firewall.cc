@@ -26,14 +26,6 @@ bool Contains(const std::vector<std::string>& list, const std::string& host) {
   return std::find(list.begin(), list.end(), host) != list.end();
 }
 
-// A provider's server hosts and, when it has one, its proxy host.
-int ReadProviderHosts(const std::string& provider, std::vector<std::string>& hosts) {
-  std::string proxy;
-  int rc = Config::GetProviderHosts(provider, true, true, hosts, proxy);
-  if (rc == Config::kStoreOk && !proxy.empty()) hosts.push_back(proxy);
-  return rc;
-}
-
 }  // namespace
 
 HostFirewall& PlatformFirewall() {
@@ -64,7 +56,7 @@ bool Firewall::CollectAllHosts(std::vector<std::string>& hosts) {
   bool all = true;
   for (const auto& id : ids) {
     std::vector<std::string> providerHosts;
-    rc = ReadProviderHosts(id, providerHosts);
+    rc = Config::GetAllProviderHosts(id, providerHosts);
     if (rc != Config::kStoreOk) {
       Log_Level(2, "Error %d getting server ips for provider %s\n", rc, id.c_str());
       all = false;
@@ -100,7 +92,7 @@ bool Firewall::DropOtherProvidersHosts(const std::string& provider, std::vector<
     if (add.empty() && remove.empty()) break;
     if (id == provider) continue;
     std::vector<std::string> hosts;
-    rc = ReadProviderHosts(id, hosts);
+    rc = Config::GetAllProviderHosts(id, hosts);
     if (rc != Config::kStoreOk) {
       Log_Level(2, "Check providers ips failed to get provider %s %d\n", id.c_str(), rc);
       Log_Level(2, "Update firewall failed to check providers\n");
@@ -121,7 +113,7 @@ bool Firewall::Update(const std::string& provider, bool checkOthers, std::vector
     // A host both added and removed stays as it is.
     std::vector<std::string> both;
     for (const auto& host : add) {
-      if (Contains(remove, host) && !Contains(both, host)) both.push_back(host);
+      if (Contains(remove, host)) both.push_back(host);
     }
     for (const auto& host : both) {
       Erase(add, host);

@@ -69,32 +69,26 @@ bool DecompressToString(std::string_view in, Groundwork::SecureString& out, size
   size_t remaining = in.size();
   size_t produced = 0;
   const char* failure = nullptr;
+  // The buffer grows to one byte beyond the bound at most: a text that
+  // fills that byte is too large.
+  const size_t capacity = maxSize + 1;
   for (;;) {
     size_t feed = std::min(remaining, kMaxFeed);
     z.avail_in = static_cast<uInt>(feed);
     if (produced == buffer.size()) {
-      if (produced >= maxSize) {
-        // Full: one more byte of output means the text is too large.
-        char probe;
-        z.next_out = reinterpret_cast<Bytef*>(&probe);
-        z.avail_out = 1;
-      } else {
-        buffer.resize(std::min(maxSize, std::max(buffer.size() * 2, kChunk)));
-      }
+      buffer.resize(std::min(capacity, std::max(buffer.size() * 2, kChunk)));
     }
-    if (produced < buffer.size()) {
-      z.next_out = reinterpret_cast<Bytef*>(buffer.data() + produced);
-      z.avail_out = static_cast<uInt>(std::min(buffer.size() - produced, kMaxFeed));
-    }
+    z.next_out = reinterpret_cast<Bytef*>(buffer.data() + produced);
+    z.avail_out = static_cast<uInt>(std::min(buffer.size() - produced, kMaxFeed));
     const size_t before = z.avail_out;
     int rc = inflate(&z, Z_NO_FLUSH);
     const size_t made = before - z.avail_out;
     remaining -= feed - z.avail_in;
-    if (produced >= maxSize && made > 0) {
+    produced += made;
+    if (produced > maxSize) {
       failure = "the text exceeds the size limit";
       break;
     }
-    produced += made;
     if (rc == Z_STREAM_END) {
       if (remaining == 0) break;
       // Another member follows (gzip writes one per appended file).
