@@ -235,6 +235,19 @@ def audited_call(root, client, method, params, token):
     return name, response
 
 
+def admin_call(env, method, params, token=None):
+    # An audited call with env's admin token unless another is given.
+    return audited_call(env.root, env.client, method, params,
+                        env.admin if token is None else token)
+
+
+def admin_ok(env, method, params):
+    # The output of an audited admin call that must succeed.
+    name, response = admin_call(env, method, params)
+    assert name is None, response
+    return response["result"]["output"]
+
+
 def first_message(response):
     return response["result"]["error"]["messages"][0]
 

@@ -4,8 +4,8 @@
 
 import pytest
 
-from harness import (add_trust_material, audited_call, first_message, free_port,
-                     make_attestation_key, mint, seed, start_seeded, write_config)
+from harness import (add_trust_material, admin_call, admin_ok, audited_call, first_message,
+                     free_port, make_attestation_key, mint, seed, start_seeded, write_config)
 
 PROVIDERS = "com.tarsel.orna.kms.providers."
 GENERATE = "com.tarsel.orna.kms.key_operation.generate_key"
@@ -23,15 +23,11 @@ def env(kmip_server, tmp_path_factory, request):
 
 
 def call(env, operation, params, token=None):
-    # A providers call with the admin token unless another is given.
-    return audited_call(env.root, env.client, PROVIDERS + operation, params,
-                        env.admin if token is None else token)
+    return admin_call(env, PROVIDERS + operation, params, token)
 
 
 def ok(env, operation, params):
-    name, response = call(env, operation, params)
-    assert name is None, response
-    return response["result"]["output"]
+    return admin_ok(env, PROVIDERS + operation, params)
 
 
 def server(name, hostname, port=None):

@@ -10,8 +10,8 @@ import zlib
 
 import pytest
 
-from harness import (add_trust_material, audited_call, first_message, make_attestation_key, mint,
-                     start_seeded)
+from harness import (add_trust_material, admin_call, admin_ok, audited_call, first_message,
+                     make_attestation_key, mint, start_seeded)
 
 RAW = "com.tarsel.orna.kms.raw_config."
 ERRORS = "com.tarsel.lumo.std.errors."
@@ -36,13 +36,11 @@ def env(kmip_server, tmp_path_factory, request):
 
 
 def call(daemon, method, params):
-    return audited_call(daemon.root, daemon.client, method, params, daemon.admin)
+    return admin_call(daemon, method, params)
 
 
 def get(daemon, info_type=None):
-    name, response = call(daemon, RAW + "get", {} if info_type is None else {"infoType": info_type})
-    assert name is None, response
-    return response["result"]["output"]
+    return admin_ok(daemon, RAW + "get", {} if info_type is None else {"infoType": info_type})
 
 
 def generate(env, daemon, provider):

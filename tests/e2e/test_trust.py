@@ -12,8 +12,8 @@ from cryptography.hazmat.primitives import hashes, serialization
 from cryptography.hazmat.primitives.asymmetric import ec
 from cryptography.x509.oid import ExtendedKeyUsageOID, NameOID
 
-from harness import (KmipServer, audited_call, cfgvault, first_message, make_attestation_key,
-                     mint, start_seeded)
+from harness import (KmipServer, admin_call, admin_ok, audited_call, cfgvault, first_message,
+                     make_attestation_key, mint, start_seeded)
 
 KMS = "com.tarsel.orna.kms."
 ERRORS = "com.tarsel.lumo.std.errors."
@@ -31,14 +31,11 @@ def env(kmip_server, tmp_path_factory, request):
 
 
 def call(env, method, params, token=None):
-    return audited_call(env.root, env.client, KMS + method, params,
-                        env.admin if token is None else token)
+    return admin_call(env, KMS + method, params, token)
 
 
 def ok(env, method, params):
-    name, response = call(env, method, params)
-    assert name is None, response
-    return response["result"]["output"]
+    return admin_ok(env, KMS + method, params)
 
 
 def create_provider(env, name, kmip, master=None):
