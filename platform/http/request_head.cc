@@ -110,10 +110,11 @@ bool IsBodylessMethod(std::string_view lowerMethod) {
 }
 
 RequestFacts GatherFacts(std::string_view lowerMethod, const std::vector<Header>& sortedHeaders,
-                         std::optional<uint64_t> contentLength) {
+                         std::optional<uint64_t> contentLength, bool chunked) {
   RequestFacts facts;
   facts.method = std::string(lowerMethod);
-  facts.contentLength = contentLength;
+  facts.contentLength = chunked ? std::nullopt : contentLength;
+  facts.chunked = chunked;
   const Header* previous = nullptr;
   for (const Header& h : sortedHeaders) {
     // Of several headers with one name the first counts.
@@ -126,8 +127,6 @@ RequestFacts GatherFacts(std::string_view lowerMethod, const std::vector<Header>
     } else if (h.name == "content-type") {
       facts.contentType = std::string(h.value);
       facts.framedOrStreamed = Contains(h.value, ".stream.json") || Contains(h.value, ".framed");
-    } else if (h.name == "transfer-encoding") {
-      facts.chunked = Contains(h.value, "chunked");
     } else if (h.name == "connection") {
       facts.keepAlive = !Contains(h.value, "close");
     } else if (h.name == "expect") {
@@ -135,7 +134,6 @@ RequestFacts GatherFacts(std::string_view lowerMethod, const std::vector<Header>
       facts.expectContinue = Groundwork::AsciiIEquals(h.value, "100-continue");
     }
   }
-  if (facts.chunked) facts.contentLength.reset();
   facts.contentTypeCode = facts.contentType ? ContentTypeCode(*facts.contentType) : 0;
   facts.responseCode = ResponseCodeFor(facts.accept);
   facts.bodyless = IsBodylessMethod(lowerMethod) ||
@@ -183,9 +181,11 @@ RequestHeadParser::Status RequestHeadParser::Parse(std::string_view input, size_
   const auto& message = parser_->get();
   const std::string method = Lower(message.method_string());
   if (method.empty()) return Fail(HttpError::kInvalidRequest);
+  // How the body is framed is what the parser itself will go by, not what a
+  // header merely mentions ("chunkedx" is not chunked).
   std::optional<uint64_t> contentLength;
   if (auto declared = parser_->content_length()) contentLength = *declared;
-  facts_ = GatherFacts(method, TolowerAndSortHeaders(message), contentLength);
+  facts_ = GatherFacts(method, TolowerAndSortHeaders(message), contentLength, parser_->chunked());
   parser_->body_limit(bodyLimit_);
   return Status::kComplete;
 }

@@ -78,9 +78,10 @@ struct RequestFacts {
 bool IsBodylessMethod(std::string_view lowerMethod);
 
 // Facts from the sorted headers of a parsed head. `contentLength` is the
-// parser's validated Content-Length, if any.
+// parser's validated Content-Length, if any, and `chunked` whether the
+// parser reads the body as chunked.
 RequestFacts GatherFacts(std::string_view lowerMethod, const std::vector<Header>& sortedHeaders,
-                         std::optional<uint64_t> contentLength);
+                         std::optional<uint64_t> contentLength, bool chunked);
 
 using RequestParser = boost::beast::http::request_parser<boost::beast::http::string_body>;
 

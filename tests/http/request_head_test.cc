@@ -84,6 +84,18 @@ TEST(RequestHeadParser, Facts) {
   EXPECT_FALSE(chunked.contentLength || chunked.keepAlive || chunked.expectContinue ||
                chunked.bodyless);
 
+  // A coding that only looks like chunked leaves the declared length in
+  // force, and a length beyond the limit refused before any body byte.
+  RequestHeadParser lookalike(64 * 1024, 2'500'000);
+  size_t consumed = 0;
+  ASSERT_EQ(lookalike.Parse("POST / HTTP/1.1\r\nTransfer-Encoding: chunkedd\r\n"
+                            "Content-Length: 90000379212\r\n\r\n",
+                            &consumed),
+            Status::kComplete);
+  EXPECT_FALSE(lookalike.Facts().chunked);
+  EXPECT_EQ(lookalike.Facts().contentLength, 90000379212u);
+  EXPECT_TRUE(lookalike.DeclaredBodyTooLarge());
+
   auto repeated = ParseWhole(
       "POST / HTTP/1.1\r\nContent-Type: text/xml\r\ncontent-type: application/json\r\n\r\n");
   EXPECT_EQ(repeated.first.contentType, "text/xml");
