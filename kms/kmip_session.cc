@@ -95,7 +95,7 @@ Groundwork::SecureString KmipKms::BuildSession(uint32_t server, bool withTrust,
     std::string certHex = Groundwork::HexEncode(cert);
     out.append("Certificate=PEM:[").append(certHex).append("], Public=PEM:[").append(certHex);
     out.append("], Private=PEM:[");
-    Groundwork::AppendHex(info_->clientPrivateKey, out);  // straight into wiping memory
+    Groundwork::AppendHex(info_->clientPrivateKey.view(), out);  // straight into wiping memory
     out.append("],");
   }
   out.append("User_Trust, Authenticate}");
@@ -130,7 +130,7 @@ KmsResult KmipKms::Perform(qlc_session* session, const std::string& keyId, const
   if (!info_->userName.empty()) {
     std::string withOptions = std::string(command) + kCredentialOptions;
     result = qlc_perform(session, withOptions.c_str(), keyId.c_str(), info_->userName.c_str(),
-                         info_->password.c_str());
+                         info_->password.data());
   } else {
     result = qlc_perform(session, command, keyId.c_str());
   }

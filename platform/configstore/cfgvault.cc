@@ -13,22 +13,17 @@
 // import creates a missing database; the other commands refuse it. Exit
 // status 0 on success, 1 on failure and 2 on a usage error, with a one-line
 // reason on standard error.
-#include <openssl/crypto.h>
-
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
-#include <fstream>
-#include <iostream>
-#include <iterator>
-#include <sstream>
 #include <string>
 #include <vector>
 
 #include "platform/configstore/export_codec.h"
 #include "platform/configstore/sqlite_store.h"
+#include "platform/util/files.h"
 #include "platform/util/secure_buffer.h"
 
 namespace {
@@ -52,18 +47,14 @@ ConfigStoreObjectId IdFrom(const std::vector<std::string>& args, bool withInstan
   return id;
 }
 
-std::string ReadInput(const std::string& name) {
-  std::ostringstream text;
-  if (name == "-") {
-    text << std::cin.rdbuf();
-    if (std::cin.bad()) throw Failure{1, "cannot read standard input"};
-    return text.str();
+// The text may hold keys: it goes straight into wiping memory.
+Groundwork::SecureString ReadInput(const std::string& name) {
+  Groundwork::SecureString text;
+  if (!Groundwork::ReadSecretFile(name, &text)) {
+    throw Failure{1, "cannot read " + (name == "-" ? std::string("standard input") : name) + ": " +
+                         std::strerror(errno)};
   }
-  std::ifstream in(name, std::ios::binary);
-  if (!in) throw Failure{1, "cannot read " + name + ": " + std::strerror(errno)};
-  text << in.rdbuf();
-  if (in.bad()) throw Failure{1, "cannot read " + name};
-  return text.str();
+  return text;
 }
 
 void Print(const std::string& text) {
@@ -77,7 +68,7 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
   const std::string& command = args[0];
   if (command == "import") {
     if (args.size() != 2) throw Failure{2, kUsage};
-    std::string text = ReadInput(args[1]);
+    std::string text(ReadInput(args[1]).view());
     Groundwork::WipeOnExit wipe(text);
     std::vector<ErrorInfo> errors;
     if (!SqliteConfigStore::Open(dbPath)->Import(text, errors)) {
@@ -96,9 +87,10 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
   auto store = SqliteConfigStore::Open(dbPath);
 
   if (command == "export") {
-    std::string text = store->Export({FilterSpecObject(id)}) + "\n";
+    std::string text = store->Export({FilterSpecObject(id)});
     Groundwork::WipeOnExit wipe(text);
     Print(text);
+    Print("\n");
   } else if (command == "list") {
     std::string text;
     for (const auto& object : store->GetObjectsByFilter(FilterSpecObject(id))) {
@@ -108,9 +100,10 @@ void Run(const std::string& dbPath, const std::vector<std::string>& args) {
   } else if (command == "get") {
     auto object = store->GetObject(id);
     if (!object) throw Failure{1, "no object " + id.ToString()};
-    std::string text = Codec::EncodeObject(*object) + "\n";
+    std::string text = Codec::EncodeObject(*object);
     Groundwork::WipeOnExit wipe(text);
     Print(text);
+    Print("\n");
   } else if (!store->DeleteObject(id)) {
     throw Failure{1, "no object " + id.ToString()};
   }

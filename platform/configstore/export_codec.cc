@@ -1,48 +1,34 @@
 #include "platform/configstore/export_codec.h"
 
-#include <openssl/crypto.h>
-
 #include <algorithm>
 #include <boost/json.hpp>
 #include <climits>
 #include <initializer_list>
-#include <new>
 #include <set>
+
+#include "platform/util/wiping_json.h"
 
 namespace OrnaConfigStore::Codec {
 namespace {
 
 namespace json = boost::json;
 
-// Heap memory for JSON trees that is overwritten with zeros when released,
-// since the trees hold credentials and private keys.
-class WipingResource final : public json::memory_resource {
-  void* do_allocate(size_t size, size_t align) override {
-    return ::operator new(size, std::align_val_t(align));
-  }
-  void do_deallocate(void* p, size_t size, size_t align) override {
-    OPENSSL_cleanse(p, size);
-    ::operator delete(p, std::align_val_t(align));
-  }
-  bool do_is_equal(const json::memory_resource& other) const noexcept override {
-    return this == &other;
-  }
-};
-
-json::storage_ptr WipingStorage() { return json::make_shared_resource<WipingResource>(); }
+json::storage_ptr WipingStorage() { return Groundwork::WipingJsonStorage(); }
 
 // ---- encoding ----
 
 json::object EncodeNode(const StoreObject& object, json::object node) {
   json::object values(node.storage());
   for (const auto& [name, value] : object.Values()) {
-    if (const auto* s = std::get_if<std::string>(&value)) {
-      values.emplace(name, json::string(*s, node.storage()));
+    if (const auto* s = std::get_if<StoreObject::Text>(&value)) {
+      values.emplace(name, json::string(std::string_view(*s), node.storage()));
     } else if (const auto* n = std::get_if<long>(&value)) {
       values.emplace(name, static_cast<int64_t>(*n));
     } else {
       json::array list(node.storage());
-      for (const auto& item : std::get<std::vector<std::string>>(value)) list.emplace_back(item);
+      for (const auto& item : std::get<StoreObject::TextList>(value)) {
+        list.emplace_back(json::string(std::string_view(item), node.storage()));
+      }
       values.emplace(name, std::move(list));
     }
   }
@@ -130,18 +116,19 @@ void DecodeValues(const json::object& values, StoreObject& target, const std::st
     if (name.empty()) Fail(path, "empty value name");
     const json::value& v = member.value();
     if (v.is_string()) {
-      target.SetValue(name, std::string(v.get_string()));
+      target.SetAnyValue(name, StoreObject::Text(v.get_string()));
     } else if (v.is_int64()) {
       target.SetValue(name, static_cast<long>(v.get_int64()));
     } else if (v.is_uint64() && v.get_uint64() <= static_cast<uint64_t>(LONG_MAX)) {
       target.SetValue(name, static_cast<long>(v.get_uint64()));
     } else if (v.is_array()) {
-      std::vector<std::string> list;
+      StoreObject::TextList list;
+      list.reserve(v.get_array().size());
       for (const auto& item : v.get_array()) {
         if (!item.is_string()) Fail(where, "a list holds only strings");
         list.emplace_back(item.get_string());
       }
-      target.SetValue(name, list);
+      target.SetAnyValue(name, std::move(list));
     } else {
       Fail(where, "a value is a string, an integer or a list of strings");
     }
@@ -198,12 +185,10 @@ ConfigStoreObjectPtr DecodeTopLevel(const json::object& node, const std::string&
 json::value Parse(std::string_view text) {
   json::parse_options options;
   options.allow_invalid_utf8 = true;  // accept every text that export writes
-  json::storage_ptr sp = WipingStorage();
-  json::parser parser(sp, options);
   boost::system::error_code ec;
-  parser.write(text.data(), text.size(), ec);
+  json::value root = json::parse(text, ec, WipingStorage(), options);
   if (ec) Fail("", "not valid JSON (" + ec.message() + ")");
-  return parser.release();
+  return root;
 }
 
 void SortScopes(std::vector<ConfigStoreObjectId>& scopes) {
@@ -242,7 +227,7 @@ std::string EncodeExport(const std::vector<ConfigStoreObjectId>& scopes,
   root.emplace("version", static_cast<int64_t>(kExportVersion));
   root.emplace("scope", std::move(scopeList));
   root.emplace("objects", std::move(objectList));
-  return json::serialize(root);
+  return Groundwork::SerializeWiping(root);
 }
 
 bool DecodeExport(std::string_view text, ExportContents& contents, std::string& error) {
@@ -293,11 +278,11 @@ bool DecodeExport(std::string_view text, ExportContents& contents, std::string& 
 }
 
 std::string EncodeObject(const ConfigStoreObject& object) {
-  return json::serialize(EncodeTopLevel(object, WipingStorage()));
+  return Groundwork::SerializeWiping(EncodeTopLevel(object, WipingStorage()));
 }
 
 std::string EncodeBody(const StoreObject& object) {
-  return json::serialize(EncodeNode(object, json::object(WipingStorage())));
+  return Groundwork::SerializeWiping(EncodeNode(object, json::object(WipingStorage())));
 }
 
 void DecodeBody(std::string_view body, StoreObject& object) {

@@ -25,8 +25,9 @@
 // name, a duplicate object or sub-object, a "provider" value that differs
 // from the instance id) is refused with a reason.
 //
-// The JSON trees built while encoding and decoding live in memory that is
-// overwritten with zeros when released; callers wipe the texts they get.
+// The JSON trees built while encoding and decoding, and the texts while they
+// are written, live in memory that is overwritten with zeros when released;
+// callers wipe the plain texts they get.
 #pragma once
 
 #include <string>

@@ -50,11 +50,11 @@ const char* TypeName(Type type) {
 bool HasType(const StoreObject::Value& value, Type type) {
   switch (type) {
     case Type::kString:
-      return std::holds_alternative<std::string>(value);
+      return std::holds_alternative<StoreObject::Text>(value);
     case Type::kLong:
       return std::holds_alternative<long>(value);
     case Type::kList:
-      return std::holds_alternative<std::vector<std::string>>(value);
+      return std::holds_alternative<StoreObject::TextList>(value);
   }
   return false;
 }

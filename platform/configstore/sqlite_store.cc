@@ -181,16 +181,11 @@ bool Exists(sqlite3* db, const ConfigStoreObjectId& id) {
 
 void Insert(sqlite3* db, const ConfigStoreObject& object, const char* verb) {
   std::string body = Codec::EncodeBody(object);
-  try {
-    Statement insert(db, std::string(verb) +
-                             " INTO objects (obj_key, obj_group, obj_component, obj_instance, body)"
-                             " VALUES (?1, ?2, ?3, ?4, ?5)");
-    insert.BindId(object.GetConfigStoreObjectId(), true).Bind(5, body).Step();
-  } catch (...) {
-    OPENSSL_cleanse(body.data(), body.size());
-    throw;
-  }
-  OPENSSL_cleanse(body.data(), body.size());
+  Groundwork::WipeOnExit wipe(body);
+  Statement insert(db, std::string(verb) +
+                           " INTO objects (obj_key, obj_group, obj_component, obj_instance, body)"
+                           " VALUES (?1, ?2, ?3, ?4, ?5)");
+  insert.BindId(object.GetConfigStoreObjectId(), true).Bind(5, body).Step();
 }
 
 }  // namespace

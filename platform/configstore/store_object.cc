@@ -10,13 +10,16 @@ const std::string kEmptyString;
 
 namespace {
 
-void Wipe(std::string& s) { OPENSSL_cleanse(s.data(), s.capacity()); }
+using Text = StoreObject::Text;
+using TextList = StoreObject::TextList;
 
+// Clears the bytes of short strings, which sit inside the string object and
+// never reach the allocator; longer ones are wiped when released.
 void WipeValue(StoreObject::Value& value) {
-  if (auto* s = std::get_if<std::string>(&value)) {
-    Wipe(*s);
-  } else if (auto* list = std::get_if<std::vector<std::string>>(&value)) {
-    for (auto& item : *list) Wipe(item);
+  if (auto* s = std::get_if<Text>(&value)) {
+    OPENSSL_cleanse(s->data(), s->capacity());
+  } else if (auto* list = std::get_if<TextList>(&value)) {
+    for (auto& item : *list) OPENSSL_cleanse(item.data(), item.capacity());
   }
 }
 
@@ -31,18 +34,18 @@ const char* TypeName(const StoreObject::Value& value) {
   }
 }
 
+// The value of `name` as a T, null when absent; throws for another type.
 template <typename T>
-bool GetTyped(const std::map<std::string, StoreObject::Value>& values, const std::string& name,
-              T* out, const char* wanted, const ConfigStoreObjectId& id) {
+const T* Typed(const std::map<std::string, StoreObject::Value>& values, const std::string& name,
+               const char* wanted, const ConfigStoreObjectId& id) {
   auto it = values.find(name);
-  if (it == values.end()) return false;
+  if (it == values.end()) return nullptr;
   const T* typed = std::get_if<T>(&it->second);
   if (typed == nullptr) {
     throw ConfigStoreException("value '" + name + "' of " + id.ToString() + " is " +
                                TypeName(it->second) + ", not " + wanted);
   }
-  *out = *typed;
-  return true;
+  return typed;
 }
 
 void CheckName(const std::string& name, const char* what) {
@@ -74,32 +77,52 @@ StoreObject::~StoreObject() {
 }
 
 bool StoreObject::GetValue(const std::string& name, std::string* value) const {
-  return GetTyped(values_, name, value, "a string", id_);
+  const Text* text = Typed<Text>(values_, name, "a string", id_);
+  if (text != nullptr) value->assign(text->data(), text->size());
+  return text != nullptr;
 }
 
 bool StoreObject::GetValue(const std::string& name, long* value) const {
-  return GetTyped(values_, name, value, "a number", id_);
+  const long* number = Typed<long>(values_, name, "a number", id_);
+  if (number != nullptr) *value = *number;
+  return number != nullptr;
 }
 
 bool StoreObject::GetValue(const std::string& name, std::vector<std::string>* value) const {
-  return GetTyped(values_, name, value, "a list of strings", id_);
+  const TextList* list = Typed<TextList>(values_, name, "a list of strings", id_);
+  if (list != nullptr) value->assign(list->begin(), list->end());
+  return list != nullptr;
+}
+
+bool StoreObject::GetValue(const std::string& name, Groundwork::SecureString* value) const {
+  const Text* text = Typed<Text>(values_, name, "a string", id_);
+  if (text != nullptr) value->assign(*text);
+  return text != nullptr;
 }
 
 void StoreObject::SetValue(const std::string& name, const std::string& value) {
-  Assign(name, value);
+  SetAnyValue(name, Text(value.data(), value.size()));
 }
 
-void StoreObject::SetValue(const std::string& name, long value) { Assign(name, value); }
+void StoreObject::SetValue(const std::string& name, long value) { SetAnyValue(name, value); }
 
 void StoreObject::SetValue(const std::string& name, const std::vector<std::string>& value) {
-  Assign(name, value);
+  TextList list;
+  list.reserve(value.size());
+  for (const auto& item : value) list.emplace_back(item.data(), item.size());
+  SetAnyValue(name, std::move(list));
 }
 
-void StoreObject::Assign(const std::string& name, Value value) {
+void StoreObject::SetValue(const std::string& name, const Groundwork::SecureString& value) {
+  SetAnyValue(name, Text(value.data(), value.size()));
+}
+
+void StoreObject::SetAnyValue(const std::string& name, Value value) {
   CheckName(name, "value");
   auto [it, inserted] = values_.try_emplace(name);
   WipeValue(it->second);
   it->second = std::move(value);
+  WipeValue(value);  // a short string moved out leaves its bytes behind
 }
 
 bool StoreObject::DeleteValue(const std::string& name) {

@@ -16,8 +16,9 @@
 // provider's servers are tried in that order); values are kept by name.
 //
 // Objects are not thread-safe: one thread works on a tree at a time. String
-// values are overwritten with zeros when an object is destroyed, since they
-// may hold credentials and private keys.
+// values may hold credentials and private keys: they live in memory that is
+// overwritten with zeros whenever it is released, and the secure overloads
+// of GetValue/SetValue move them without a plain copy on the way.
 #pragma once
 
 #include <map>
@@ -27,6 +28,7 @@
 #include <vector>
 
 #include "platform/runtime/system.h"
+#include "platform/util/secure_buffer.h"
 
 namespace OrnaConfigStore {
 
@@ -98,7 +100,9 @@ using StoreObjectPtr = std::shared_ptr<StoreObject>;
 
 class StoreObject {
  public:
-  using Value = std::variant<std::string, long, std::vector<std::string>>;
+  using Text = Groundwork::SecureString::Base;
+  using TextList = std::vector<Text, Groundwork::ZeroingAllocator<Text>>;
+  using Value = std::variant<Text, long, TextList>;
 
   explicit StoreObject(ConfigStoreObjectId id) : id_(std::move(id)) {}
   virtual ~StoreObject();
@@ -114,12 +118,17 @@ class StoreObject {
   bool GetValue(const std::string& name, std::string* value) const;
   bool GetValue(const std::string& name, long* value) const;
   bool GetValue(const std::string& name, std::vector<std::string>* value) const;
+  // For secrets: the copy goes straight into wiping memory.
+  bool GetValue(const std::string& name, Groundwork::SecureString* value) const;
 
   // Sets (or replaces, whatever its type was) the value. Throws
   // ConfigStoreException for an empty name.
   void SetValue(const std::string& name, const std::string& value);
   void SetValue(const std::string& name, long value);
   void SetValue(const std::string& name, const std::vector<std::string>& value);
+  void SetValue(const std::string& name, const Groundwork::SecureString& value);
+  // Sets a value of whichever type `value` holds (decoding stored text).
+  void SetAnyValue(const std::string& name, Value value);
   // Returns whether a value was removed.
   bool DeleteValue(const std::string& name);
 
@@ -140,8 +149,6 @@ class StoreObject {
   std::vector<StoreObjectPtr> GetAllSubObjects() const;
 
  private:
-  void Assign(const std::string& name, Value value);
-
   ConfigStoreObjectId id_;
   std::map<std::string, Value> values_;
   std::map<std::string, std::vector<StoreObjectPtr>> subObjects_;  // by name

@@ -15,14 +15,13 @@
 #include <openssl/evp.h>
 
 #include <cstdio>
-#include <fstream>
 #include <iostream>
-#include <iterator>
 #include <string>
 #include <vector>
 
 #include "platform/kmip/qlkmipsimple.h"
 #include "platform/kmip/session_description.h"
+#include "platform/util/files.h"
 #include "platform/util/secure_buffer.h"
 
 namespace {
@@ -35,15 +34,6 @@ constexpr const char* kUsage =
 int Usage(const std::string& why) {
   std::cerr << "kmipcli: " << why << "\n" << kUsage;
   return 2;
-}
-
-// Reads straight into a wiping string, since the file may hold a key.
-bool ReadFile(const std::string& path, Groundwork::SecureString* out) {
-  std::ifstream in(path, std::ios::binary);
-  if (!in) return false;
-  out->clear();
-  out->str().assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-  return !in.bad();
 }
 
 bool ParsePort(const std::string& text, uint16_t* port) {
@@ -174,7 +164,7 @@ int main(int argc, char** argv) {
       have_port = true;
     } else if (a == "--ca") {
       Groundwork::SecureString pem;
-      if (!ReadFile(v, &pem)) return Usage("cannot read " + v);
+      if (!Groundwork::ReadSecretFile(v, &pem)) return Usage("cannot read " + v);
       o.config.trustedCertificates.emplace_back(pem.view());
     } else if (a == "--cert") {
       cert_file = v;
@@ -206,14 +196,16 @@ int main(int argc, char** argv) {
   if (cert_file.empty() != key_file.empty()) return Usage("--cert and --key go together");
   if (!cert_file.empty()) {
     Groundwork::SecureString cert;
-    if (!ReadFile(cert_file, &cert)) return Usage("cannot read " + cert_file);
-    if (!ReadFile(key_file, &o.config.clientPrivateKey)) return Usage("cannot read " + key_file);
+    if (!Groundwork::ReadSecretFile(cert_file, &cert)) return Usage("cannot read " + cert_file);
+    if (!Groundwork::ReadSecretFile(key_file, &o.config.clientPrivateKey))
+      return Usage("cannot read " + key_file);
     o.config.clientCertificate.assign(cert.view());
   }
   if (o.user.empty() != password_file.empty())
     return Usage("--user and --password-file go together");
   if (!password_file.empty()) {
-    if (!ReadFile(password_file, &o.password)) return Usage("cannot read " + password_file);
+    if (!Groundwork::ReadSecretFile(password_file, &o.password))
+      return Usage("cannot read " + password_file);
     auto& p = o.password.str();
     size_t end = p.find_first_of("\r\n");
     if (end != std::string::npos) p.resize(end);

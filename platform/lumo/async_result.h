@@ -82,8 +82,8 @@ class AsyncResult {
   explicit AsyncResult(Core::Completion completion) : completion_(std::move(completion)) {}
 
   void SetResult(const T& value) const {
-    completion_.Complete(
-        Core::MethodResult::Output(boost::json::value_from(value, Data::WipingStorage())));
+    completion_.Complete(Core::MethodResult::Output(
+        boost::json::value_from(value, Groundwork::WipingJsonStorage())));
   }
   void SetError(Data::ErrorValuePtr error) const {
     completion_.Complete(Core::MethodResult::Error(std::move(error)));

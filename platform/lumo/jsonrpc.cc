@@ -37,7 +37,7 @@ std::string_view BearerToken(std::string_view header) {
 }
 
 value ErrorJson(const Data::ErrorValue& error) {
-  object out(Data::WipingStorage());
+  object out(Groundwork::WipingJsonStorage());
   out["name"] = error.Name();
   if (error.Type()) out["errorType"] = Data::ErrorTypeName(*error.Type());
   out["messages"] = Data::MessagesToJson(error.Messages());
@@ -45,11 +45,11 @@ value ErrorJson(const Data::ErrorValue& error) {
 }
 
 Transport::HttpCallResult Respond(value id, value result) {
-  object response(Data::WipingStorage());
+  object response(Groundwork::WipingJsonStorage());
   response["jsonrpc"] = "2.0";
   response["id"] = std::move(id);
   response["result"] = std::move(result);
-  return {Data::SerializeWiping(response), {}};
+  return {Groundwork::SerializeWiping(response), {}};
 }
 
 Transport::HttpCallResult ProtocolError(value id, int code, std::string message) {
@@ -57,7 +57,7 @@ Transport::HttpCallResult ProtocolError(value id, int code, std::string message)
   response["jsonrpc"] = "2.0";
   response["id"] = std::move(id);
   response["error"] = object{{"code", code}, {"message", std::move(message)}};
-  return {Data::SerializeWiping(response), {}};
+  return {Groundwork::SerializeWiping(response), {}};
 }
 
 Transport::HttpCallResult Serialize(value id, int responseCode, Core::MethodResult result) {
@@ -65,12 +65,12 @@ Transport::HttpCallResult Serialize(value id, int responseCode, Core::MethodResu
   switch (result.kind) {
     case Core::MethodResult::Kind::kOutput: {
       if (direct) return Respond(std::move(id), std::move(result.output));
-      object wrapped(Data::WipingStorage());
+      object wrapped(Groundwork::WipingJsonStorage());
       wrapped["output"] = std::move(result.output);
       return Respond(std::move(id), std::move(wrapped));
     }
     case Core::MethodResult::Kind::kError: {
-      object wrapped(Data::WipingStorage());
+      object wrapped(Groundwork::WipingJsonStorage());
       wrapped["error"] = ErrorJson(*result.error);
       Transport::HttpCallResult out = Respond(std::move(id), std::move(wrapped));
       out.errorName = result.error->Name();
@@ -93,7 +93,7 @@ class Handler {
   void operator()(const std::shared_ptr<Transport::HttpCall>& http,
                   const std::function<void(Transport::HttpCallResult)>& done) const {
     boost::system::error_code ec;
-    value request = boost::json::parse(http->body, ec, Data::WipingStorage());
+    value request = boost::json::parse(http->body, ec, Groundwork::WipingJsonStorage());
     Wipe(http->body);
     if (ec) {
       Wipe(http->authorization);
@@ -103,7 +103,7 @@ class Handler {
     }
     value id = nullptr;
     std::string method;
-    value params(Data::WipingStorage());
+    value params(Groundwork::WipingJsonStorage());
     if (!Envelope(request, id, method, params)) {
       Wipe(http->authorization);
       done(ProtocolError(std::move(id), kInvalidRequest, "Invalid Request"));

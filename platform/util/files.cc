@@ -2,6 +2,7 @@
 
 #include <errno.h>
 #include <fcntl.h>
+#include <openssl/crypto.h>
 #include <string.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -26,6 +27,31 @@ bool WriteAll(int fd, const char* data, size_t size) {
     size -= static_cast<size_t>(n);
   }
   return true;
+}
+
+bool ReadAll(int fd, SecureString* out) {
+  out->clear();
+  char chunk[4096];
+  ssize_t n;
+  while ((n = ::read(fd, chunk, sizeof chunk)) != 0) {
+    if (n < 0 && errno == EINTR) continue;
+    if (n < 0) break;
+    out->str().append(chunk, static_cast<size_t>(n));
+  }
+  OPENSSL_cleanse(chunk, sizeof chunk);
+  if (n < 0) out->clear();
+  return n == 0;
+}
+
+bool ReadSecretFile(const std::string& path, SecureString* out) {
+  if (path == "-") return ReadAll(STDIN_FILENO, out);
+  int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  if (fd < 0) return false;
+  bool ok = ReadAll(fd, out);
+  int saved = errno;
+  ::close(fd);
+  errno = saved;
+  return ok;
 }
 
 bool ReplaceFile(const std::string& path, std::string_view content, mode_t mode,

@@ -1,6 +1,6 @@
-// Small file-system helpers shared by the platform layers that keep files
-// under the root: creating directories, writing whole buffers, and
-// replacing a file atomically.
+// Small file-system helpers shared by the platform layers and tools that
+// keep files under the root: creating directories, reading and writing whole
+// buffers, and replacing a file atomically.
 #pragma once
 
 #include <sys/types.h>
@@ -8,6 +8,8 @@
 #include <cstddef>
 #include <string>
 #include <string_view>
+
+#include "platform/util/secure_buffer.h"
 
 namespace Groundwork {
 
@@ -19,6 +21,12 @@ bool MakeDirectories(const std::string& dir, mode_t mode);
 // Writes all of `data` to `fd`, retrying after interruptions and short
 // writes. False (errno set) on the first failure.
 bool WriteAll(int fd, const char* data, size_t size);
+
+// Reads everything from `fd` (the file `path`; "-" is standard input) into
+// `out`, with no buffer of its own, since the text may hold a key. False
+// (errno set) when it cannot be read; `out` then holds nothing.
+bool ReadAll(int fd, SecureString* out);
+bool ReadSecretFile(const std::string& path, SecureString* out);
 
 // Replaces the file `path` with `content`, readable with `mode`, so that a
 // reader or a crash sees either the old file or the new one in full: the

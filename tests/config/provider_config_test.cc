@@ -148,7 +148,7 @@ TEST_F(ProviderConfigTest, ClientConfigurationCarriesTrustMaterialStandardised) 
   ASSERT_EQ(ReadClientConfig("p1", client), kStoreOk);
   EXPECT_EQ(client.name + " " + client.masterKeyId + " " + client.proxyHost + ":" +
                 std::to_string(client.proxyPort) + " " + std::to_string(client.connectionTimeout) +
-                " " + client.userName + "/" + client.password,
+                " " + client.userName + "/" + std::string(client.password.view()),
             "p1 mk-p1 proxy.example:3128 30 alice/s3cret");
   ASSERT_EQ(client.servers.size(), 2u);
   EXPECT_EQ(client.servers[0].name + " " + client.servers[0].hostname + ":" +
@@ -161,7 +161,7 @@ TEST_F(ProviderConfigTest, ClientConfigurationCarriesTrustMaterialStandardised) 
   ASSERT_EQ(SetClientCertificate("p1", messy, cert.privateKeyPem), kStoreOk);
   ASSERT_EQ(ReadClientConfig("p1", client), kStoreOk);
   EXPECT_EQ(client.clientCertificate, pem);
-  EXPECT_EQ(client.clientPrivateKey, cert.privateKeyPem);
+  EXPECT_EQ(client.clientPrivateKey.view(), cert.privateKeyPem);
 
   Tamper("p1", [](ProviderConfigObjects& o) {
     o.kmipServer->GetSubObject(SubObjectId("client_certificate"))->DeleteValue("private_key");

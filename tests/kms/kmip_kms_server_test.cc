@@ -31,7 +31,7 @@ std::shared_ptr<KmsInfo> Provider(const std::string& masterKey, std::vector<uint
   info->masterKeyId = masterKey;
   info->connectionTimeout = 5;
   info->clientCertificate = PkiPem(client);
-  info->clientPrivateKey = ZyrdTest::PkiKey(client);
+  info->clientPrivateKey.assign(ZyrdTest::PkiKey(client));
   if (!trusted.empty()) info->trustedServerCertificates = {PkiPem(trusted)};
   for (size_t i = 0; i < ports.size(); ++i) {
     info->servers.push_back({"s" + std::to_string(i + 1), "127.0.0.1", ports[i]});
@@ -239,7 +239,7 @@ TEST_F(KmipKmsServerTest, CredentialsAreSentWithEveryKeyCommandAndNeverLogged) {
   FakeKmipServer fake(Kmip::KeyServer("mk", std::vector<uint8_t>(16, 3), 2));
   auto info = Provider("mk", {fake.port()});
   info->userName = "alice";
-  info->password = "p}a,s{s'";
+  info->password.assign("p}a,s{s'");
   ASSERT_EQ(Generate(KmipKms(info), 16).result, Ok);
   auto requests = fake.requests();
   ASSERT_EQ(requests.size(), 2u);  // Get, then Get Attributes
