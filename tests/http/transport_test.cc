@@ -9,6 +9,7 @@
 
 #include "daemon/logger.h"
 #include "platform/http/server.h"
+#include "tests/support/freed_memory_scan.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/raw_http_client.h"
 
@@ -126,6 +127,29 @@ TEST_F(TransportTest, CallsCarryHeadersAndBodyAndManyShareOneConnection) {
   client.Send(Post("{}", "Connection: keep-alive, Close\r\n"));
   EXPECT_EQ(client.ReadExactly(Ok("echo:{}", "close").size()), Ok("echo:{}", "close"));
   EXPECT_TRUE(client.PeerClosed());
+}
+
+// What a request and its answer carry (token, body) is overwritten before the
+// server's threads release or reuse its memory.
+TEST_F(TransportTest, RequestAndResponseBytesAreWipedBeforeTheirMemoryIsReleased) {
+  const std::string token = "Bearer token-3c9e51d07a2b4f68",
+                    asked = "request-body-81f6d2c4a9e03b57",
+                    answer = "response-body-5a0e7c93d1b64f28";
+  respond_ = [&answer](auto, auto done) {
+    std::string body;
+    body.reserve(answer.size() * 100);
+    for (int i = 0; i < 100; ++i) body.append(answer);
+    done({std::move(body), ""});
+  };
+  const std::string request = Post(asked, "Authorization: " + token + "\r\nConnection: close\r\n");
+  ZyrdTest::FreedMemoryScan scan({token, asked, answer},
+                                 ZyrdTest::FreedMemoryScan::Threads::kOthers);
+  RawHttpClient client(port_);
+  client.Send(request);
+  EXPECT_EQ(client.ReadResponse().body.size(), answer.size() * 100);
+  EXPECT_TRUE(client.PeerClosed());
+  StopServer();  // the closed session is released on a server thread before this returns
+  EXPECT_EQ(scan.Stop(), 0);
 }
 
 TEST_F(TransportTest, ErrorResultCarriesLumoErrorHeader) {
