@@ -5,7 +5,7 @@ import pytest
 
 sys.path.insert(0, str(pathlib.Path(__file__).parent))
 
-from harness import Daemon, KmipServer  # noqa: E402
+from harness import Daemon, KmipServer, leaked_secrets  # noqa: E402
 
 
 @pytest.fixture
@@ -28,3 +28,11 @@ def kmip_server(tmp_path_factory):
     server = KmipServer(tmp_path_factory.mktemp("kmip")).start()
     yield server
     server.stop()
+
+
+@pytest.fixture(scope="session", autouse=True)
+def no_secret_in_logs():
+    # After the whole suite: no key, token, credential or private key that a
+    # test used shows up in any daemon's log or audit file.
+    yield
+    assert leaked_secrets() == []

@@ -1,6 +1,7 @@
 # Real processes for black-box tests: zyrd under a scratch root, a PyKMIP
 # server with a throwaway PKI, a JSON-RPC client, and the developer tools.
 
+import base64
 import http.client
 import json
 import os
@@ -19,6 +20,63 @@ TOOLS = SOURCE_DIR / "tools"
 sys.path.insert(0, str(TOOLS))
 
 import pykmip_tool  # noqa: E402
+
+# Every secret the tests handed to a daemon or got from one (text -> what it
+# is), and every root a daemon ran under: at the end the suite checks that
+# no log line and no audit record there holds any of them.
+SECRETS = {}
+PUBLIC = set()  # texts a test also sent as plain data: never taken for a leak
+DAEMON_ROOTS = []
+SECRET_NAMES = {"key", "keys", "credential", "privateKey", "password"}
+
+
+def secret(value, what):
+    # Remembers value (and the forms a log could show it in: each long line,
+    # the bytes it encodes in Base64 as hex and as text); returns it.
+    if not isinstance(value, str) or len(value) < 12:
+        return value
+    SECRETS[value] = what
+    for line in value.splitlines():
+        if len(line) >= 40:
+            SECRETS[line] = what + " (a line)"
+    try:
+        raw = base64.b64decode(value, validate=True)
+    except ValueError:
+        return value
+    if len(raw) >= 12:
+        SECRETS[raw.hex()] = what + " (hex)"
+        if raw.isascii() and raw.decode().isprintable():
+            SECRETS[raw.decode()] = what + " (decoded)"
+    return value
+
+
+def remember_secrets(value, what):
+    # secret() for every string under a secret's name in a JSON value.
+    if isinstance(value, dict):
+        for name, item in value.items():
+            if name in SECRET_NAMES:
+                for text in item if isinstance(item, list) else [item]:
+                    secret(text, "%s %r" % (what, name))
+            else:
+                remember_secrets(item, what)
+    elif isinstance(value, str) and len(value) >= 12:
+        PUBLIC.add(value)
+    elif isinstance(value, list):
+        for item in value:
+            remember_secrets(item, what)
+
+
+def leaked_secrets():
+    # (file, what) for each remembered secret found in a daemon's log or
+    # audit files.
+    found = []
+    for root in DAEMON_ROOTS:
+        files = list(root.glob("zyrd-*.log")) + list((root / "var/log/zyrd").glob("audit.log*"))
+        for path in files:
+            text = path.read_text(errors="replace")
+            found += [(str(path), what) for value, what in SECRETS.items()
+                      if value in text and not any(value in public for public in PUBLIC)]
+    return found
 
 
 def free_port():
@@ -44,6 +102,7 @@ class Daemon:
         metadata.parent.mkdir(parents=True, exist_ok=True)
         metadata.write_bytes((SOURCE_DIR / "metadata/zyr_lumo_metadata.json").read_bytes())
         env = {**os.environ, "ZYRD_ROOT": str(root), "ZYRD_HTTP_PORT": "0", **(env or {})}
+        DAEMON_ROOTS.append(pathlib.Path(root))
         fd, self.log = tempfile.mkstemp(prefix="zyrd-", suffix=".log", dir=root)
         self.log = pathlib.Path(self.log)
         self.proc = subprocess.Popen([str(BUILD_DIR / "zyrd")], stdin=subprocess.DEVNULL,
@@ -174,14 +233,17 @@ class Client:
         self.next_id += 1
         if params is not None:
             body["params"] = params
+            remember_secrets(params, method)
         headers = {"Content-Type": "application/json"}
         if token:
-            headers["Authorization"] = "Bearer " + token
+            headers["Authorization"] = "Bearer " + secret(token, "token")
         self.conn.request("POST", "/api", json.dumps(body), headers)
         response = self.conn.getresponse()
         data = response.read()
         assert response.status == 200, (response.status, data)
-        return response.getheader("lumo-error"), json.loads(data)
+        decoded = json.loads(data)
+        remember_secrets(decoded, method)
+        return response.getheader("lumo-error"), decoded
 
 
 def seed(root, spec):
@@ -202,10 +264,10 @@ def make_attestation_key(directory):
 def mint(key_path, *args):
     done = subprocess.run([str(TOOLS / "mint-attestation-token"), "--key", str(key_path), *args],
                           check=True, stdout=subprocess.PIPE)
-    return done.stdout.decode().strip()
+    return secret(done.stdout.decode().strip(), "attestation token")
 
 
-def start_seeded(root, spec, request, config="<log><level>verbose</level></log>"):
+def start_seeded(root, spec, request, config="<log><level>trivia</level></log>"):
     # A daemon with the config.xml body config over a store seeded with spec
     # (see seed), killed at the end of the pytest request; with a client and
     # the admin token.
@@ -220,7 +282,8 @@ def start_seeded(root, spec, request, config="<log><level>verbose</level></log>"
 def admin_token(daemon, root):
     # The host admin token, which the daemon creates at its first start.
     daemon.http_port()  # start-up has passed the token handler
-    return (pathlib.Path(root) / "var/lib/zyrd/admin.token").read_text().strip()
+    return secret((pathlib.Path(root) / "var/lib/zyrd/admin.token").read_text().strip(),
+                  "admin token")
 
 
 def audited_call(root, client, method, params, token):
@@ -270,7 +333,8 @@ def add_trust_material(root, provider, kmip):
     kmip_server["subObjects"].append({
         "name": "client_certificate", "instance": "", "subObjects": [],
         "values": {"certificate": kmip.pem("client"),
-                   "private_key": kmip.key_path("client").read_text()}})
+                   "private_key": secret(kmip.key_path("client").read_text(),
+                                         "client private key")}})
     done = cfgvault(root, "import", "-", stdin=json.dumps(text).encode())
     assert done.returncode == 0, done.stderr
 

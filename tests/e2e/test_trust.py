@@ -264,13 +264,3 @@ def test_credential(env, tmp_path, request):
         name, response = audited_call(other.root, other.client, KMS + "providers.credential.get",
                                       {"provider": "cred"}, other.admin)
         assert response["result"]["output"] == {"credential": stored}, response
-
-
-def test_no_secret_reaches_the_log(env):
-    # Runs last in this module: every key and credential used so far.
-    log = env.daemon.log.read_text()
-    assert "s3cr3t-credential" not in log
-    assert "PRIVATE KEY" not in log
-    for name in ("client", "client2"):
-        body = env.kmip.key_path(name).read_text().splitlines()[1]
-        assert body not in log
