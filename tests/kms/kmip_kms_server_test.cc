@@ -3,6 +3,8 @@
 // does not produce.
 #include <gtest/gtest.h>
 
+#include <chrono>
+
 #include "kms/kmip_kms.h"
 #include "platform/ssl/ssl_utils.h"
 #include "platform/util/base64.h"
@@ -137,14 +139,47 @@ TEST_F(KmipKmsServerTest, KeyStatesDecideWhatEachOperationMayDo) {
   }
 }
 
-TEST_F(KmipKmsServerTest, FaultsMapToTheirResults) {
-  // A server that accepts and never answers: the time-out is reported as
-  // such, not as a missing key.
-  FakeKmipServer silent(nullptr, "server", FakeKmipServer::Mode::kNoHandshake);
-  auto info = Provider("mk", {silent.port()});
-  info->connectionTimeout = 1;
-  EXPECT_EQ(Generate(KmipKms(info)).result, KeyServerTimeout);
+// A faulty server costs a key operation at most the connection time-out
+// (bounded with a generous margin) and no descriptor; a broken or stalled
+// stream is a communication failure or a time-out, not a missing key, and an
+// oversized message is a library failure (reported as a missing key).
+TEST_F(KmipKmsServerTest, FaultyServersCostAtMostTheTimeOutAndNoDescriptor) {
+  constexpr int kTimeout = 1;
+  const std::vector<uint8_t> full = Kmip::Key("mk", std::vector<uint8_t>(32, 7));
+  const std::vector<uint8_t> huge = {0x42, 0x00, 0x7b, 0x01, 0x80, 0x00, 0x00, 0x00};  // 2^31
+  const struct {
+    const char* what;
+    ZyrdTest::FakeReply reply;
+    KmsResult result;
+    FakeKmipServer::Mode mode = FakeKmipServer::Mode::kTls;
+  } cases[] = {
+      {"closed in the header", {full, 5, true}, KeyServerCommunicationError},
+      {"closed in the body", {full, full.size() / 2, true}, KeyServerCommunicationError},
+      {"2^31 bytes announced", {huge}, MasterKeyNotFound},
+      {"stalled after the handshake", {{}, SIZE_MAX, false, true}, KeyServerTimeout},
+      {"no handshake", {}, KeyServerTimeout, FakeKmipServer::Mode::kNoHandshake},
+  };
+  {  // whatever OpenSSL opens once per process is open before counting
+    FakeKmipServer warm(Kmip::KeyServer("mk", std::vector<uint8_t>(32, 7), 2));
+    ASSERT_EQ(Generate(KmipKms(Provider("mk", {warm.port()}))).result, Ok);
+  }
+  for (const auto& t : cases) {
+    const size_t before = ZyrdTest::OpenDescriptors();
+    {
+      FakeKmipServer server([&](const std::vector<uint8_t>&) { return t.reply; }, "server", t.mode);
+      auto info = Provider("mk", {server.port()});
+      info->connectionTimeout = kTimeout;
+      const auto start = std::chrono::steady_clock::now();
+      Op o = Generate(KmipKms(info));
+      EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(kTimeout + 5))
+          << t.what;
+      EXPECT_EQ(o.result, t.result) << t.what << ": " << o.reason;
+    }
+    EXPECT_EQ(ZyrdTest::OpenDescriptors(), before) << t.what;
+  }
+}
 
+TEST_F(KmipKmsServerTest, FaultsMapToTheirResults) {
   // An answer without key material, and a malformed answer, are library
   // failures that surface as a missing master key.
   FakeKmipServer noKey([](const std::vector<uint8_t>& request) {

@@ -10,6 +10,8 @@
 #include <unistd.h>
 
 #include <cstdlib>
+#include <filesystem>
+#include <iterator>
 #include <sstream>
 
 namespace ZyrdTest {
@@ -110,6 +112,12 @@ void LoopbackServer::Stop() {
   for (std::thread& t : workers_) t.join();
   close(listen_fd_);
   close(stop_fd_);
+}
+
+size_t OpenDescriptors() {
+  // The iterator's own descriptor is among the entries, on every call alike.
+  const std::filesystem::directory_iterator entries("/proc/self/fd");
+  return static_cast<size_t>(std::distance(begin(entries), end(entries)));
 }
 
 TcpRelay::TcpRelay(Mode mode, uint16_t target_port)

@@ -116,6 +116,10 @@ class TcpRelay {
   LoopbackServer server_;
 };
 
+// The number of file descriptors this process has open (the entries of
+// /proc/self/fd), to show that a code path leaves none behind.
+size_t OpenDescriptors();
+
 // A loopback port on which nothing listens (it did a moment ago).
 inline uint16_t ClosedPort() {
   return LoopbackServer([](int) {}).port();
