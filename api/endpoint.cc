@@ -62,6 +62,7 @@ Lumo::Transport::ServerConfig Endpoint::MakeServerConfig(
   config.endpoint6 = tcp::endpoint(asio::ip::address_v6::loopback(), tcpPort);
   config.logger = std::move(logger);
   config.readTimeout = std::chrono::minutes(20);
+  config.requestTimeout = std::chrono::seconds(20);
   config.writeTimeout = std::chrono::minutes(30);
   config.httpBodySizeLimitInBytes = 2'500'000;
   config.protocolHandlerSpec.maxRequestSize = 2'500'000;

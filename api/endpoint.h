@@ -27,8 +27,8 @@ class Endpoint {
   static constexpr int kWorkerCount = 5;
 
   // The listener and limit settings for `port` (its low 16 bits): 127.0.0.1
-  // and ::1, read timeout 20 minutes, write timeout 30 minutes, bodies up to
-  // 2,500,000 bytes.
+  // and ::1, read timeout 20 minutes, 20 seconds for all of a request, write
+  // timeout 30 minutes, bodies up to 2,500,000 bytes.
   static Lumo::Transport::ServerConfig MakeServerConfig(uint32_t port,
                                                         std::shared_ptr<Lumo::Log::Logger> logger);
 

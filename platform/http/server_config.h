@@ -56,6 +56,11 @@ struct ServerConfig {
   // (so the peer reads the response instead of a reset), and how much.
   std::chrono::nanoseconds lingerTimeout = std::chrono::seconds(2);
   uint64_t lingerMaxBytes = 8u << 20;
+
+  // Not logged either. Longest time from the first byte of a request to its
+  // last (head and body): readTimeout alone restarts with every byte, so a
+  // peer sending one byte at a time could hold a connection for ever.
+  std::chrono::nanoseconds requestTimeout = std::chrono::seconds(20);
 };
 
 // "ServerConfig{endpoint4:127.0.0.1:7888;endpoint6:[::1]:7888;Localizer not

@@ -3,6 +3,7 @@
 
 #include <openssl/crypto.h>
 
+#include <algorithm>
 #include <array>
 #include <atomic>
 #include <boost/asio/dispatch.hpp>
@@ -119,7 +120,10 @@ void Session::Read(Step next, bool inBody) {
     Close();
     return;
   }
-  stream_.expires_after(context_->config.readTimeout);
+  std::chrono::steady_clock::time_point expiry =
+      std::chrono::steady_clock::now() + context_->config.readTimeout;
+  if (requestDeadline_) expiry = std::min(expiry, *requestDeadline_);
+  stream_.expires_at(expiry);
   stream_.async_read_some(buffer_.prepare(room),
                           [self = shared_from_this(), next, inBody](error_code ec, size_t n) {
                             if (ec) {
@@ -136,10 +140,14 @@ void Session::Read(Step next, bool inBody) {
 
 void Session::BeginRequest() {
   head_.emplace(kMaxHeadBytes, context_->config.httpBodySizeLimitInBytes);
+  requestDeadline_.reset();
   ParseHead();
 }
 
 void Session::ParseHead() {
+  if (!requestDeadline_ && buffer_.size() > 0) {
+    requestDeadline_ = std::chrono::steady_clock::now() + context_->config.requestTimeout;
+  }
   size_t consumed = 0;
   const auto status = head_->Parse(Buffered(), &consumed);
   Consume(consumed);

@@ -9,6 +9,7 @@
 #include <boost/asio/ip/tcp.hpp>
 #include <boost/beast/core/flat_buffer.hpp>
 #include <boost/beast/core/tcp_stream.hpp>
+#include <chrono>
 #include <memory>
 #include <optional>
 #include <string>
@@ -74,6 +75,8 @@ class Session : public std::enable_shared_from_this<Session> {
   std::string peer_;
   boost::beast::flat_buffer buffer_;
   std::optional<RequestHeadParser> head_;
+  // Set by the first byte of a request: when all of it must have arrived.
+  std::optional<std::chrono::steady_clock::time_point> requestDeadline_;
   // The response being written; wiped once written.
   bool keepAlive_ = true;
   bool streamed_ = false;
