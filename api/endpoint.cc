@@ -1,5 +1,8 @@
 #include "api/endpoint.h"
 
+#include <sys/resource.h>
+
+#include <algorithm>
 #include <charconv>
 #include <condition_variable>
 #include <cstdlib>
@@ -66,7 +69,26 @@ Lumo::Transport::ServerConfig Endpoint::MakeServerConfig(
   config.writeTimeout = std::chrono::minutes(30);
   config.httpBodySizeLimitInBytes = 2'500'000;
   config.protocolHandlerSpec.maxRequestSize = 2'500'000;
+  config.maxConnections = ConnectionLimit();
   return config;
+}
+
+size_t Endpoint::ConnectionLimit() {
+  // A connection holds one descriptor. Without a bound, connections that sit
+  // idle would take the descriptors that key-server connections and the store
+  // need, and a usual soft limit of 1024 is just short of the bound.
+  rlimit limit{};
+  if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return kMaxConnections;
+  const rlim_t wanted = std::min<rlim_t>(kMaxConnections + kReservedDescriptors, limit.rlim_max);
+  if (limit.rlim_cur < wanted) {
+    rlimit raised = limit;
+    raised.rlim_cur = wanted;
+    if (setrlimit(RLIMIT_NOFILE, &raised) == 0) limit = raised;
+  }
+  const rlim_t usable = limit.rlim_cur > 2 * kReservedDescriptors
+                            ? limit.rlim_cur - kReservedDescriptors
+                            : limit.rlim_cur / 2;
+  return static_cast<size_t>(std::min<rlim_t>(kMaxConnections, std::max<rlim_t>(usable, 1)));
 }
 
 Endpoint::Endpoint(uint32_t port, asio::io_context& io, Lumo::Transport::HttpCallHandler handler,

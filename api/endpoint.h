@@ -10,6 +10,7 @@
 
 #include <boost/asio/executor_work_guard.hpp>
 #include <boost/asio/io_context.hpp>
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -25,12 +26,23 @@ class Endpoint {
  public:
   static constexpr uint32_t kDefaultPort = 7888;
   static constexpr int kWorkerCount = 5;
+  // At most this many HTTP connections are open at once, and this many
+  // descriptors are kept for everything else (store, logs, key servers).
+  static constexpr size_t kMaxConnections = 1024;
+  static constexpr size_t kReservedDescriptors = 128;
 
   // The listener and limit settings for `port` (its low 16 bits): 127.0.0.1
   // and ::1, read timeout 20 minutes, 20 seconds for all of a request, write
-  // timeout 30 minutes, bodies up to 2,500,000 bytes.
+  // timeout 30 minutes, bodies up to 2,500,000 bytes, and as many connections
+  // as ConnectionLimit() allows.
   static Lumo::Transport::ServerConfig MakeServerConfig(uint32_t port,
                                                         std::shared_ptr<Lumo::Log::Logger> logger);
+
+  // Raises the process's soft limit of open descriptors (no further than its
+  // hard limit) to what kMaxConnections connections and kReservedDescriptors
+  // need, and returns how many connections the limit then allows: at most
+  // kMaxConnections, fewer when the hard limit is lower.
+  static size_t ConnectionLimit();
 
   // Builds the server (which logs its configuration once). `handler` serves
   // every call; `logger` receives the transport's messages.

@@ -13,9 +13,10 @@ void StartSession(tcp::socket socket, std::shared_ptr<const ServerContext> conte
 
 }  // namespace
 
-Server::Server(asio::io_context& io, ServerConfig config, HttpCallHandler handler)
-    : context_(std::make_shared<const ServerContext>(
-          ServerContext{std::move(config), std::move(handler)})) {
+Server::Server(asio::io_context& io, ServerConfig config, HttpCallHandler handler) {
+  auto connections = std::make_shared<Connections>(config.maxConnections);
+  context_ = std::make_shared<const ServerContext>(
+      ServerContext{std::move(config), std::move(handler), std::move(connections)});
   const auto& logger = context_->config.logger;
   LUMO_LOG(logger, Log::kInfo) << ToString(context_->config) << "\n";
   // The listeners hold the context, not the server, so a connection accepted

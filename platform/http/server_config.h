@@ -4,6 +4,7 @@
 
 #include <boost/asio/ip/tcp.hpp>
 #include <chrono>
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -61,6 +62,9 @@ struct ServerConfig {
   // last (head and body): readTimeout alone restarts with every byte, so a
   // peer sending one byte at a time could hold a connection for ever.
   std::chrono::nanoseconds requestTimeout = std::chrono::seconds(20);
+  // Most connections open at once. One more closes the connection that has
+  // waited longest for a request head, or, when none waits, is closed itself.
+  size_t maxConnections = 1024;
 };
 
 // "ServerConfig{endpoint4:127.0.0.1:7888;endpoint6:[::1]:7888;Localizer not

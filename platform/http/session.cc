@@ -83,6 +83,39 @@ class Session::Completion {
   std::atomic<bool> done_{false};
 };
 
+std::shared_ptr<Session> Connections::Open(const std::shared_ptr<Session>& session) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  session->counted_ = true;
+  if (++open_ <= max_) return nullptr;
+  while (!waiting_.empty()) {
+    Session* oldest = waiting_.front();
+    waiting_.pop_front();
+    oldest->waitingAt_.reset();
+    // One that is being destroyed (its destructor waits for the lock) closes
+    // by itself; the next one is chosen.
+    if (auto victim = oldest->weak_from_this().lock()) return victim;
+  }
+  return session;
+}
+
+void Connections::Closed(Session& session) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  if (session.waitingAt_) waiting_.erase(*session.waitingAt_);
+  session.waitingAt_.reset();
+  if (session.counted_) --open_;
+}
+
+void Connections::Waiting(Session& session) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  if (!session.waitingAt_) session.waitingAt_ = waiting_.insert(waiting_.end(), &session);
+}
+
+void Connections::Busy(Session& session) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  if (session.waitingAt_) waiting_.erase(*session.waitingAt_);
+  session.waitingAt_.reset();
+}
+
 Session::Session(asio::ip::tcp::socket socket, std::shared_ptr<const ServerContext> context)
     : stream_(std::move(socket)), context_(std::move(context)), buffer_(kMaxHeadBytes) {
   error_code ec;
@@ -91,13 +124,34 @@ Session::Session(asio::ip::tcp::socket socket, std::shared_ptr<const ServerConte
 }
 
 Session::~Session() {
+  context_->connections->Closed(*this);
   auto readable = buffer_.data();
   OPENSSL_cleanse(readable.data(), readable.size());
   WipeString(responseBody_);
 }
 
 void Session::Start() {
-  asio::dispatch(stream_.get_executor(), [self = shared_from_this()] { self->BeginRequest(); });
+  auto self = shared_from_this();
+  auto closing = context_->connections->Open(self);
+  if (closing == self) {
+    // Every open connection is busy with a request: this one is closed as
+    // the last owner lets go of the session.
+    LUMO_LOG(Logger(), Log::kInfo)
+        << "Connection limit reached: closing the new connection [" << peer_ << "]\n";
+    return;
+  }
+  if (closing) closing->Evict();
+  asio::dispatch(stream_.get_executor(), [self] { self->BeginRequest(); });
+}
+
+void Session::Evict() {
+  asio::post(stream_.get_executor(), [self = shared_from_this()] {
+    if (!self->awaitingHead_) return;  // a request has arrived meanwhile
+    LUMO_LOG(self->Logger(), Log::kInfo)
+        << "Connection limit reached: closing the connection waiting longest for a request ["
+        << self->peer_ << "]\n";
+    self->Close();
+  });
 }
 
 std::string_view Session::Buffered() const {
@@ -141,6 +195,8 @@ void Session::Read(Step next, bool inBody) {
 void Session::BeginRequest() {
   head_.emplace(kMaxHeadBytes, context_->config.httpBodySizeLimitInBytes);
   requestDeadline_.reset();
+  awaitingHead_ = true;
+  context_->connections->Waiting(*this);
   ParseHead();
 }
 
@@ -166,6 +222,8 @@ void Session::ParseHead() {
 }
 
 void Session::OnHead() {
+  awaitingHead_ = false;
+  context_->connections->Busy(*this);
   const RequestFacts& facts = head_->Facts();
   LUMO_LOG(Logger(), Log::kTrace) << "Request head: [" << peer_ << "]\n";
 

@@ -10,7 +10,9 @@
 #include <boost/beast/core/flat_buffer.hpp>
 #include <boost/beast/core/tcp_stream.hpp>
 #include <chrono>
+#include <list>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -25,11 +27,44 @@ namespace Lumo::Transport::PicoHttp {
 // Largest request head (request line and headers) and so the read buffer.
 inline constexpr size_t kMaxHeadBytes = 64 * 1024;
 
-// What a server shares with its sessions; immutable once serving starts and
-// kept alive by every session that uses it.
+class Session;
+
+// The open connections of a server, and those of them that wait for a
+// request head, longest waiting first. Bounds how many are open at once
+// (ServerConfig::maxConnections): a connection beyond the bound makes room
+// by closing the one that has waited longest for a head, as idle keep-alive
+// connections and heads that never complete are the cheapest to give up.
+// Thread-safe.
+class Connections {
+ public:
+  explicit Connections(size_t max) : max_(max) {}
+  Connections(const Connections&) = delete;
+  Connections& operator=(const Connections&) = delete;
+
+  // Counts `session` as open. Beyond the bound returns the session to close
+  // instead: the one waiting longest for a head (taken off the waiting
+  // list), or `session` itself when none waits. Null within the bound.
+  std::shared_ptr<Session> Open(const std::shared_ptr<Session>& session);
+  // The session's connection has gone (from its destructor).
+  void Closed(Session& session);
+  // The session waits for a request head, or no longer does.
+  void Waiting(Session& session);
+  void Busy(Session& session);
+
+ private:
+  std::mutex mutex_;
+  const size_t max_;
+  size_t open_ = 0;
+  std::list<Session*> waiting_;
+};
+
+// What a server shares with its sessions; immutable once serving starts
+// (but for the connection count) and kept alive by every session that uses
+// it.
 struct ServerContext {
   ServerConfig config;
   HttpCallHandler handler;
+  std::shared_ptr<Connections> connections;
 };
 
 class Session : public std::enable_shared_from_this<Session> {
@@ -40,10 +75,16 @@ class Session : public std::enable_shared_from_this<Session> {
   Session(const Session&) = delete;
   Session& operator=(const Session&) = delete;
 
-  // Starts reading the first request. Thread-safe.
+  // Counts the connection among the server's open ones and starts reading
+  // the first request, or closes it when it is one too many. Thread-safe.
   void Start();
 
+  // Closes the connection if it is still waiting for a request head: it was
+  // chosen to make room for a new one. Thread-safe.
+  void Evict();
+
  private:
+  friend class Connections;
   class Completion;
   using Step = void (Session::*)();
 
@@ -77,6 +118,11 @@ class Session : public std::enable_shared_from_this<Session> {
   std::optional<RequestHeadParser> head_;
   // Set by the first byte of a request: when all of it must have arrived.
   std::optional<std::chrono::steady_clock::time_point> requestDeadline_;
+  bool awaitingHead_ = false;
+  // Guarded by the mutex of Connections: whether Open counted this session,
+  // and its entry in the waiting list.
+  bool counted_ = false;
+  std::optional<std::list<Session*>::iterator> waitingAt_;
   // The response being written; wiped once written.
   bool keepAlive_ = true;
   bool streamed_ = false;
