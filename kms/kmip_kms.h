@@ -3,15 +3,23 @@
 // Every operation that needs a server opens a fresh TLS session to it through
 // the KMIP client library, performs its commands and disconnects; no session
 // outlives one operation. The status cache (master key, its state, the
-// provider's KmsStatus and the certificates the servers present) is written
-// only by UpdateStatus, under the client's lock, and read under it by the key
+// provider's KmsStatus and the certificates the servers present) is replaced
+// by UpdateStatus, under the client's lock, and read under it by the key
 // operations; no KMIP call and no cryptography ever runs under the lock.
+//
+// A key operation that finds no master key cached reads it from its server
+// once for every caller waiting at that moment (the others wait for that read
+// and share its outcome), and keeps a key it found, unless destroyed, in the
+// cache until the next UpdateStatus replaces it. A failed read is not kept.
 //
 // Thread-safe: any number of requests and the scheduled status update may use
 // one client at once.
 #pragma once
 
+#include <condition_variable>
+#include <map>
 #include <memory>
+#include <mutex>
 #include <string>
 #include <vector>
 
@@ -102,7 +110,16 @@ class KmipKms final : public Kms {
 
  private:
   struct ProbeResult;
+  struct KeyRead;
 
+  // The master key and its state from the server (only the state when `key`
+  // holds the key already).
+  KmsResult ReadMasterKey(uint32_t server, const std::string& keyId,
+                          Groundwork::SecureBytes& key, int32_t& state, std::string& reason);
+  // ReadMasterKey of the configured key, shared with the callers that wait
+  // for the same server meanwhile; fills the cache.
+  KmsResult ReadSharedMasterKey(uint32_t server, Groundwork::SecureBytes& key, int32_t& state,
+                                std::string& reason);
   const std::string& ServerName(uint32_t server) const;
   // Whether `server` indexes a configured server; when not, `reason` says so.
   bool HasServer(uint32_t server, std::string& reason) const;
@@ -121,6 +138,10 @@ class KmipKms final : public Kms {
   KmsStatus cachedStatus_;
   std::vector<std::string> remoteCerts_;
   bool statusValid_ = false;
+
+  std::mutex readsMutex_;  // guards reads_; never held with lock_
+  std::condition_variable readDone_;
+  std::map<uint32_t, std::shared_ptr<KeyRead>> reads_;  // in flight, by server
 };
 
 }  // namespace Zyrd::Kms

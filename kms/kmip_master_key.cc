@@ -83,15 +83,24 @@ KmsResult KmipKms::GetKeyState(qlc_session* session, const std::string& keyId, i
   return MapKmipError(m);
 }
 
+// One read of the configured master key, and those who wait for it.
+struct KmipKms::KeyRead {
+  bool done = false;
+  KmsResult result = Ok;
+  Groundwork::SecureBytes key;
+  int32_t state = kKeyStateUnknown;
+  std::string reason;
+};
+
 KmsResult KmipKms::GetMasterKey(uint32_t server, const std::string& keyId, bool refreshState,
-                                Groundwork::SecureBytes& key, int32_t& state,
-                                std::string& reason) {
+                                Groundwork::SecureBytes& key, int32_t& state, std::string& reason) {
   const char* provider = info_->name.c_str();
   state = kKeyStateUnknown;
   if (!HasServer(server, reason)) return OtherFailure;
-  if (keyId == info_->masterKeyId) {
+  const bool configured = keyId == info_->masterKeyId;
+  if (configured) {
     UserLock::ReadGuard guard(*lock_);
-    if (statusValid_ && !cachedKey_.empty()) {
+    if (!cachedKey_.empty()) {
       key = cachedKey_;
       if (!refreshState && cachedState_ != kKeyStateUnknown) {
         state = cachedState_;
@@ -101,7 +110,57 @@ KmsResult KmipKms::GetMasterKey(uint32_t server, const std::string& keyId, bool 
       Log_Level(6, "Provider %s using cached key\n", provider);
     }
   }
+  if (configured && !refreshState && key.empty()) {
+    return ReadSharedMasterKey(server, key, state, reason);
+  }
+  return ReadMasterKey(server, keyId, key, state, reason);
+}
 
+KmsResult KmipKms::ReadSharedMasterKey(uint32_t server, Groundwork::SecureBytes& key,
+                                       int32_t& state, std::string& reason) {
+  std::shared_ptr<KeyRead> read;
+  bool reader = false;
+  {
+    std::lock_guard<std::mutex> guard(readsMutex_);
+    std::shared_ptr<KeyRead>& slot = reads_[server];
+    if (!slot) {
+      slot = std::make_shared<KeyRead>();
+      reader = true;
+    }
+    read = slot;
+  }
+  if (reader) {
+    read->result = ReadMasterKey(server, info_->masterKeyId, read->key, read->state, read->reason);
+    // Kept under the rules of a status refresh: a key found and not destroyed.
+    if (read->result == Ok && read->state != kKeyStateUnknown && read->state != 5 &&
+        read->state != 6) {
+      UserLock::WriteGuard guard(*lock_);
+      if (cachedKey_.empty()) {
+        cachedKey_ = read->key;
+        cachedState_ = read->state;
+      }
+    }
+    {
+      std::lock_guard<std::mutex> guard(readsMutex_);
+      read->done = true;
+      reads_.erase(server);
+    }
+    readDone_.notify_all();
+  } else {
+    Log_Level(6, "Provider %s waiting for the master key read in flight\n", info_->name.c_str());
+    std::unique_lock<std::mutex> guard(readsMutex_);
+    readDone_.wait(guard, [&] { return read->done; });
+  }
+  key = read->key;
+  state = read->state;
+  reason = read->reason;
+  return read->result;
+}
+
+KmsResult KmipKms::ReadMasterKey(uint32_t server, const std::string& keyId,
+                                 Groundwork::SecureBytes& key, int32_t& state,
+                                 std::string& reason) {
+  const char* provider = info_->name.c_str();
   qlc_session* session = nullptr;
   KmsResult r = Connect(session, server, reason);
   if (r != Ok) {

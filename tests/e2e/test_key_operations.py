@@ -36,7 +36,8 @@ def env(kmip_server, tmp_path_factory, request):
     env = start_seeded(root, {"providers": [provider("p1", active, [live]),
                                             provider("failover", active,
                                                      [("dead", free_port()), live]),
-                                            provider("deact", deact, [live])],
+                                            provider("deact", deact, [live]),
+                                            provider("deact-cold", deact, [live])],
                               "attestationCertificate": cert}, request)
     env.__dict__.update(key=key_path, token=mint(key_path), kmip=kmip_server, deact=deact,
                         active=active)
@@ -95,11 +96,15 @@ def test_deactivated_master_key_decrypts_but_does_not_encrypt(env):
     assert name is None, response
     wrapped = response["result"]["output"]["wrappedKey"]
     env.kmip.admin(("revoke", env.deact, "deactivated"))
-    name, response = generate(env, "deact")
+    # The key read before stays cached until the next status refresh; a
+    # provider that has not read it yet sees the new state at once.
+    assert generate(env, "deact")[0] is None
+    name, response = generate(env, "deact-cold")
     assert name == ERRORS + "error"
     assert first_message(response)["id"] == "com.tarsel.orna.kms.master_key_unusable_for_encryption"
     assert first_message(response)["args"]["server"] == "live"
-    name, response = call(env, KEY_OPS + "decrypt", {"provider": "deact", "wrappedKey": wrapped})
+    name, response = call(env, KEY_OPS + "decrypt",
+                          {"provider": "deact-cold", "wrappedKey": wrapped})
     assert name is None, response
 
 

@@ -3,7 +3,9 @@
 // does not produce.
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <chrono>
+#include <thread>
 
 #include "kms/kmip_kms.h"
 #include "platform/ssl/ssl_utils.h"
@@ -185,9 +187,16 @@ TEST_F(KmipKmsServerTest, FaultsMapToTheirResults) {
   FakeKmipServer noKey([](const std::vector<uint8_t>& request) {
     return ZyrdTest::FakeReply{Kmip::Key(Kmip::ReadRequest(request).id, {}, false)};
   });
-  Op o = Generate(KmipKms(Provider("mk", {noKey.port()})));
+  KmipKms client(Provider("mk", {noKey.port()}));
+  Op o = Generate(client);
   EXPECT_EQ(o.result, MasterKeyNotFound);
   EXPECT_FALSE(o.reason.empty());
+  // The failed read was not kept; the good one is, until a status refresh.
+  noKey.SetHandler(Kmip::KeyServer("mk", std::vector<uint8_t>(32, 7), 2));
+  EXPECT_EQ(Generate(client).result, Ok);
+  const size_t requests = noKey.requests().size();
+  EXPECT_EQ(Generate(client).result, Ok);
+  EXPECT_EQ(noKey.requests().size(), requests);
   // Complete framing around an item of an unknown type.
   FakeKmipServer garbage([](const std::vector<uint8_t>&) {
     return ZyrdTest::FakeReply{
@@ -258,6 +267,20 @@ TEST_F(KmipKmsServerTest, CachedStatusServesKeyOperationsWithoutAnyConnection) {
   Op other = Generate(KmipKms(OnPyKmip("aes128")), 16);
   EXPECT_EQ(Decrypt(client, other.wrapped).result, Ok);
   EXPECT_GT(relay.connections(), afterProbe);
+}
+
+// Key operations on a client without a cached key share one read of it.
+TEST_F(KmipKmsServerTest, ConcurrentColdOperationsShareOneReadOfTheMasterKey) {
+  TcpRelay relay(TcpRelay::Mode::kForward, KmipPort());
+  KmipKms client(Provider(TestKey("aes256").id, {relay.port()}));
+  std::atomic<int> succeeded{0};
+  std::vector<std::thread> callers;
+  for (int i = 0; i < 8; ++i) {
+    callers.emplace_back([&] { succeeded += Generate(client).result == Ok ? 1 : 0; });
+  }
+  for (auto& caller : callers) caller.join();
+  EXPECT_EQ(succeeded, 8);
+  EXPECT_EQ(relay.connections(), 1u);
 }
 
 TEST_F(KmipKmsServerTest, RemoteCertificateIsFetchedWithoutTrust) {
