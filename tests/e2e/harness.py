@@ -15,6 +15,9 @@ import time
 import types
 
 BUILD_DIR = pathlib.Path(os.environ.get("ZYRD_BUILD_DIR", "build")).resolve()
+# Multiplies every time-out of the harness: a sanitizer build runs several
+# times slower (the thread sanitizer sets 5).
+TIME_SCALE = float(os.environ.get("ZYRD_TEST_TIME_SCALE", "1"))
 SOURCE_DIR = pathlib.Path(__file__).resolve().parents[2]
 TOOLS = SOURCE_DIR / "tools"
 sys.path.insert(0, str(TOOLS))
@@ -95,7 +98,8 @@ def write_config(root, body):
 
 class Daemon:
     # A zyrd process on a free port (unless env names one) with the metadata
-    # installed under root; its standard error goes to a zyrd-*.log there.
+    # installed under root; its standard error goes to a zyrd-*.log there. A
+    # sanitizer's report in that log fails the test once the process ended.
 
     def __init__(self, root, env=None):
         metadata = pathlib.Path(root) / "usr/lib/tarsel/lumo/zyr_lumo_metadata.json"
@@ -108,13 +112,14 @@ class Daemon:
         self.proc = subprocess.Popen([str(BUILD_DIR / "zyrd")], stdin=subprocess.DEVNULL,
                                      stdout=subprocess.DEVNULL, stderr=fd, env=env)
         os.close(fd)
+        self.checked = False
 
     def lines(self):
         return self.log.read_text(errors="replace").splitlines()
 
     def _until(self, done, what, timeout=10.0):
         # Polls done() until it holds; fails when the daemon ended or time ran out.
-        deadline = time.monotonic() + timeout
+        deadline = time.monotonic() + timeout * TIME_SCALE
         while not done():
             if self.proc.poll() is not None or time.monotonic() > deadline:
                 time.sleep(0.1)  # what the daemon wrote last
@@ -145,12 +150,22 @@ class Daemon:
         # Waits for the end of start-up, signals, and returns the exit status.
         self._until(self.handles_sigterm, "end of start-up")
         self.proc.send_signal(sig)
-        return self.proc.wait(timeout)
+        status = self.proc.wait(timeout * TIME_SCALE)
+        self._check_log()
+        return status
 
     def kill(self):
         if self.proc.poll() is None:
             self.proc.kill()
         self.proc.wait()
+        self._check_log()
+
+    def _check_log(self):
+        # Once per process, after it ended (sanitizers report as they detect).
+        if not self.checked:
+            self.checked = True
+            log = self.log.read_text(errors="replace")
+            assert "Sanitizer" not in log, "sanitizer report in %s:\n%s" % (self.log, log)
 
 
 class KmipServer:
@@ -224,7 +239,7 @@ class Client:
     # One kept-alive HTTP connection to a daemon.
 
     def __init__(self, port):
-        self.conn = http.client.HTTPConnection("127.0.0.1", port, timeout=30)
+        self.conn = http.client.HTTPConnection("127.0.0.1", port, timeout=30 * TIME_SCALE)
         self.next_id = 1
 
     def call(self, method, params=None, token=None):
@@ -318,7 +333,7 @@ def first_message(response):
 def cfgvault(root, *args, stdin=None):
     # Runs cfgvault on the root's store; returns the completed process.
     return subprocess.run([str(BUILD_DIR / "cfgvault"), *args], input=stdin,
-                          capture_output=True, timeout=30,
+                          capture_output=True, timeout=30 * TIME_SCALE,
                           env={**os.environ, "ZYRD_ROOT": str(root)})
 
 
@@ -343,7 +358,7 @@ def audit_records(root, at_least=0, timeout=5.0):
     # The audit records so far; waits until there are `at_least` of them
     # (a call's record is written as it completes, around its response).
     path = pathlib.Path(root) / "var/log/zyrd/audit.log"
-    deadline = time.monotonic() + timeout
+    deadline = time.monotonic() + timeout * TIME_SCALE
     while True:
         lines = path.read_text().splitlines() if path.exists() else []
         if len(lines) >= at_least or time.monotonic() > deadline:
