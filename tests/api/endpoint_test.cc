@@ -14,6 +14,7 @@
 #include "platform/runtime/app.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/raw_http_client.h"
+#include "tests/support/time_scale.h"
 
 namespace {
 
@@ -64,6 +65,7 @@ TEST(EndpointTest, EveryWorkerRunsWhateverThePoolSize) {
   std::mutex mutex;
   std::condition_variable cv;
   int arrived = 0;
+  const auto patience = ZyrdTest::Scaled(std::chrono::seconds(5));
   boost::asio::io_context io;
   Zyrd::ZyrApi::Endpoint endpoint(
       0, io,
@@ -71,7 +73,7 @@ TEST(EndpointTest, EveryWorkerRunsWhateverThePoolSize) {
         std::unique_lock<std::mutex> lock(mutex);
         ++arrived;
         cv.notify_all();
-        bool all = cv.wait_for(lock, std::chrono::seconds(5), [&] { return arrived >= 5; });
+        bool all = cv.wait_for(lock, patience, [&] { return arrived >= 5; });
         done({all ? "all" : "short", ""});
       },
       std::make_shared<Zyrd::ZyrApi::LumoLoggerWrapper>(&Log_Level));

@@ -7,6 +7,7 @@
 #include <thread>
 
 #include "platform/runtime/thread_pool.h"
+#include "tests/support/time_scale.h"
 
 namespace {
 
@@ -25,7 +26,7 @@ TEST(AsioScheduler, RunsOnceAfterTheDelayAndCanRearmFromTheCallback) {
   };
   auto start = std::chrono::steady_clock::now();
   scheduler.Schedule(20ms, tick);
-  ASSERT_EQ(done.get_future().wait_for(5s), std::future_status::ready);
+  ASSERT_EQ(done.get_future().wait_for(ZyrdTest::Scaled(5s)), std::future_status::ready);
   EXPECT_GE(std::chrono::steady_clock::now() - start, 20ms);
   EXPECT_EQ(runs.load(), 3);
 }
@@ -37,7 +38,7 @@ TEST(AsioScheduler, CancelledItemNeverRuns) {
   item.Cancel();
   std::promise<void> later;
   scheduler.Schedule(100ms, [&] { later.set_value(); });
-  ASSERT_EQ(later.get_future().wait_for(5s), std::future_status::ready);
+  ASSERT_EQ(later.get_future().wait_for(ZyrdTest::Scaled(5s)), std::future_status::ready);
   EXPECT_FALSE(ran.load());
 }
 
