@@ -3,7 +3,7 @@ BUILD_DIR ?= build
 RUN_ROOT ?= $(CURDIR)/.run
 CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DZYRD_WERROR=ON
 
-.PHONY: all deps build test run bench fuzz clean
+.PHONY: all deps build test tsan run bench fuzz clean
 
 all: build
 
@@ -20,6 +20,11 @@ test: build
 	ctest --test-dir $(BUILD_DIR) --output-on-failure -j2
 	scripts/run-fuzzers
 
+# The unit and black-box tests again, built with the thread sanitizer in
+# build-tsan/ (scripts/run-tsan); any report fails. CI runs it after `test`.
+tsan: deps
+	scripts/run-tsan
+
 run: build
 	scripts/run-local $(BUILD_DIR) $(RUN_ROOT)
 
@@ -31,4 +36,4 @@ fuzz: deps
 	scripts/run-fuzzers --explore
 
 clean:
-	rm -rf $(BUILD_DIR) build-fuzz $(RUN_ROOT)
+	rm -rf $(BUILD_DIR) build-fuzz build-tsan $(RUN_ROOT)
