@@ -3,7 +3,7 @@ BUILD_DIR ?= build
 RUN_ROOT ?= $(CURDIR)/.run
 CMAKE_FLAGS ?= -DCMAKE_BUILD_TYPE=RelWithDebInfo -DZYRD_WERROR=ON
 
-.PHONY: all deps build test tsan run bench fuzz clean
+.PHONY: all deps build test tsan run bench soak fuzz clean
 
 all: build
 
@@ -31,6 +31,11 @@ run: build
 bench: build
 	bench/run-http-bench $(BUILD_DIR)
 	bench/run-key-bench $(BUILD_DIR)
+
+# Ten minutes of mixed calls at a bounded rate with the daemon's resident
+# memory sampled (SOAK_SECONDS, SOAK_RATE, ... in bench/run-soak).
+soak: build
+	bench/run-soak $(BUILD_DIR)
 
 fuzz: deps
 	scripts/run-fuzzers --explore

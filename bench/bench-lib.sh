@@ -2,6 +2,10 @@
 # stopped when the script exits.
 #
 #   start_server <command...>  runs a server that prints "port <n>"; sets $port
+#   start_zyrd <build-dir> <log>  runs the daemon (under the root that
+#                                scripts/local-env.sh set up) on a free port,
+#                                its standard error in log; sets $port and
+#                                $zyrd_pid
 #   measure <label> <url> [lua]  runs wrk once against url, prints one line
 #                                with requests per second and latency
 #                                percentiles; sets $rate
@@ -36,6 +40,22 @@ start_server() {
   done
   rm -f "$out"
   [[ -n "$port" ]] || { echo "bench: $1 did not start" >&2; exit 1; }
+}
+
+start_zyrd() {
+  local log=$2
+  : >"$log"  # there before the first look, however late the daemon starts
+  ZYRD_HTTP_PORT=0 "$1/zyrd" 2>>"$log" &
+  zyrd_pid=$!
+  bench_pids+=("$zyrd_pid")
+  port=
+  for _ in $(seq 400); do
+    port=$(sed -n 's/.*HTTP endpoint listening on TCP port \([0-9]*\).*/\1/p' "$log")
+    [[ -n "$port" ]] && break
+    kill -0 "$zyrd_pid" 2>/dev/null || break
+    sleep 0.05
+  done
+  [[ -n "$port" ]] || { cat "$log" >&2; echo "bench: zyrd did not start" >&2; exit 1; }
 }
 
 measure() {
