@@ -13,8 +13,9 @@
 -- for the connections to keep up.
 --
 -- The JSON-RPC id names the kind of call, so the response (which echoes it)
--- can be classified without knowing its connection; a decrypt call carries
--- the key it must return in its id. Outcomes: "ok" (the expected result),
+-- can be classified without knowing its connection. Each thread keeps the
+-- first keys that generate_key returned it; a decrypt call names one of them
+-- by its index in the id, and must return that key. Outcomes: "ok" (the expected result),
 -- "expected" (the expected refusal of a bad token or a malformed body), and
 -- "unexpected" (anything else). done() prints one "soak-count" line per kind
 -- and up to a few unexpected answers.
@@ -56,10 +57,8 @@ counts = {}
 unexpected = {}
 local position = 0
 local serial = 0
-local keys = {}  -- ring of {wrappedKey, key} from generate_key answers
-local keysFill = 0
-local keysPos = 0
-local kRing = 256
+local keys = {}  -- {wrappedKey, key} from the first generate_key answers
+local kKeptKeys = 256
 
 local threads = {}
 
@@ -84,13 +83,13 @@ function request()
   position = position % #cycle + 1
   serial = serial + 1
   local kind = cycle[position]
-  if kind == "decrypt" and keysFill == 0 then kind = "generate" end
+  if kind == "decrypt" and #keys == 0 then kind = "generate" end
   if kind == "generate" then
     return post(token, body("generate", api .. "key_operation.generate_key", generateParams))
   elseif kind == "decrypt" then
-    local k = keys[math.random(keysFill)]
-    return post(token, body("decrypt:" .. k[2], api .. "key_operation.decrypt",
-      '{"provider":"local","wrappedKey":"' .. k[1] .. '"}'))
+    local index = math.random(#keys)
+    return post(token, body("decrypt:" .. index, api .. "key_operation.decrypt",
+      '{"provider":"local","wrappedKey":"' .. keys[index][1] .. '"}'))
   elseif kind == "status" then
     return post(token, body("status", api .. "status.get", "{}"))
   elseif kind == "provider-get" then
@@ -138,14 +137,13 @@ local function classify(kind, idText, status, body)
   if kind == "generate" then
     local wrapped, key = string.match(body, '"output":{"wrappedKey":"([^"]+)","key":"([^"]+)"}')
     if status ~= 200 or not wrapped then return "unexpected" end
-    if keysFill < kRing then keysFill = keysFill + 1 end
-    keysPos = keysPos % kRing + 1
-    keys[keysPos] = {wrapped, key}
+    if #keys < kKeptKeys then table.insert(keys, {wrapped, key}) end
     return "ok"
   elseif kind == "decrypt" then
-    local want = string.sub(idText, #"decrypt:" + 1)
+    local index = string.match(idText, "^decrypt:(%d+)$")
+    local kept = index and keys[tonumber(index)]
     local got = string.match(body, '"output":{"key":"([^"]+)"}')
-    return (status == 200 and got == want) and "ok" or "unexpected"
+    return (status == 200 and kept ~= nil and got == kept[2]) and "ok" or "unexpected"
   elseif kind == "status" then
     return (status == 200 and has(body, '"output":{"health":"HEALTHY"')) and "ok" or "unexpected"
   elseif kind == "provider-get" then
