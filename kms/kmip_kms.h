@@ -39,6 +39,9 @@ inline constexpr int kKmipErrorUntrusted = 110;
 // KMIP State attribute values; -1 when unknown.
 inline constexpr int32_t kKeyStateUnknown = -1;
 
+// Destroyed or destroyed-compromised: such a key is never kept in a cache.
+inline bool IsKeyDestroyed(int32_t state) { return state == 5 || state == 6; }
+
 // Supported master key sizes in bits, in the order the status reason lists them.
 inline constexpr int kSupportedKeySizes[] = {128, 256};
 

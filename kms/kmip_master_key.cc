@@ -132,8 +132,7 @@ KmsResult KmipKms::ReadSharedMasterKey(uint32_t server, Groundwork::SecureBytes&
   if (reader) {
     read->result = ReadMasterKey(server, info_->masterKeyId, read->key, read->state, read->reason);
     // Kept under the rules of a status refresh: a key found and not destroyed.
-    if (read->result == Ok && read->state != kKeyStateUnknown && read->state != 5 &&
-        read->state != 6) {
+    if (read->result == Ok && read->state != kKeyStateUnknown && !IsKeyDestroyed(read->state)) {
       UserLock::WriteGuard guard(*lock_);
       if (cachedKey_.empty()) {
         cachedKey_ = read->key;

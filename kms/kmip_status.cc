@@ -196,7 +196,7 @@ void KmipKms::Probe(ProbeResult& result) {
     result.remoteCerts.push_back(std::move(cert));
   }
 
-  if (!result.status.masterKeyFound || result.state == 5 || result.state == 6) {
+  if (!result.status.masterKeyFound || IsKeyDestroyed(result.state)) {
     Log_Level(6, "Master key not found or already destroyed, clearing cache. Provider %s key %s\n",
               provider, info_->masterKeyId.c_str());
     Groundwork::Wipe(result.key);

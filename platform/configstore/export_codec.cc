@@ -13,8 +13,6 @@ namespace {
 
 namespace json = boost::json;
 
-json::storage_ptr WipingStorage() { return Groundwork::WipingJsonStorage(); }
-
 // ---- encoding ----
 
 json::object EncodeNode(const StoreObject& object, json::object node) {
@@ -186,7 +184,7 @@ json::value Parse(std::string_view text) {
   json::parse_options options;
   options.allow_invalid_utf8 = true;  // accept every text that export writes
   boost::system::error_code ec;
-  json::value root = json::parse(text, ec, WipingStorage(), options);
+  json::value root = json::parse(text, ec, Groundwork::WipingJsonStorage(), options);
   if (ec) Fail("", "not valid JSON (" + ec.message() + ")");
   return root;
 }
@@ -208,7 +206,7 @@ std::string EncodeExport(const std::vector<ConfigStoreObjectId>& scopes,
   for (const auto& object : objects) sortedScopes.push_back(object->GetConfigStoreObjectId());
   SortScopes(sortedScopes);
 
-  json::storage_ptr sp = WipingStorage();
+  json::storage_ptr sp = Groundwork::WipingJsonStorage();
   json::array scopeList(sp);
   for (const auto& scope : sortedScopes) {
     scopeList.emplace_back(json::object(
@@ -278,11 +276,12 @@ bool DecodeExport(std::string_view text, ExportContents& contents, std::string& 
 }
 
 std::string EncodeObject(const ConfigStoreObject& object) {
-  return Groundwork::SerializeWiping(EncodeTopLevel(object, WipingStorage()));
+  return Groundwork::SerializeWiping(EncodeTopLevel(object, Groundwork::WipingJsonStorage()));
 }
 
 std::string EncodeBody(const StoreObject& object) {
-  return Groundwork::SerializeWiping(EncodeNode(object, json::object(WipingStorage())));
+  return Groundwork::SerializeWiping(
+      EncodeNode(object, json::object(Groundwork::WipingJsonStorage())));
 }
 
 void DecodeBody(std::string_view body, StoreObject& object) {

@@ -98,10 +98,14 @@ std::shared_ptr<Session> Connections::Open(const std::shared_ptr<Session>& sessi
   return session;
 }
 
-void Connections::Closed(Session& session) {
-  std::lock_guard<std::mutex> lock(mutex_);
+void Connections::StopWaiting(Session& session) {
   if (session.waitingAt_) waiting_.erase(*session.waitingAt_);
   session.waitingAt_.reset();
+}
+
+void Connections::Closed(Session& session) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  StopWaiting(session);
   if (session.counted_) --open_;
 }
 
@@ -112,8 +116,7 @@ void Connections::Waiting(Session& session) {
 
 void Connections::Busy(Session& session) {
   std::lock_guard<std::mutex> lock(mutex_);
-  if (session.waitingAt_) waiting_.erase(*session.waitingAt_);
-  session.waitingAt_.reset();
+  StopWaiting(session);
 }
 
 Session::Session(asio::ip::tcp::socket socket, std::shared_ptr<const ServerContext> context)

@@ -52,6 +52,8 @@ class Connections {
   void Busy(Session& session);
 
  private:
+  void StopWaiting(Session& session);  // with mutex_ held
+
   std::mutex mutex_;
   const size_t max_;
   size_t open_ = 0;
